@@ -1,0 +1,142 @@
+#include "common/json.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdlib>
+#include <memory>
+#include <sstream>
+
+#include "common/strings.h"
+
+namespace quarrox {
+namespace {
+
+Json::CharReaderBuilder MakeReaderBuilder() {
+  Json::CharReaderBuilder builder;
+  Json::CharReaderBuilder::strictMode(&builder.settings_);
+  builder["strictRoot"] = false;
+  builder["rejectDupKeys"] = false;
+  return builder;
+}
+
+Json::StreamWriterBuilder MakeWriterBuilder() {
+  Json::StreamWriterBuilder builder;
+  builder["indentation"] = "";
+  builder["emitUTF8"] = true;
+  return builder;
+}
+
+// Closes on every road, and says whether closing worked where that matters.
+class Descriptor {
+ public:
+  explicit Descriptor(int fd) : fd_(fd) {}
+  ~Descriptor() { Close(); }
+  Descriptor(const Descriptor&) = delete;
+  Descriptor& operator=(const Descriptor&) = delete;
+  int get() const { return fd_; }
+  bool Close() {
+    const int fd = fd_;
+    fd_ = -1;
+    return fd < 0 || close(fd) == 0;
+  }
+
+ private:
+  int fd_;
+};
+
+bool ReadAll(int fd, std::string& text) {
+  char buffer[65536];
+  for (;;) {
+    const ssize_t n = read(fd, buffer, sizeof(buffer));
+    if (n == 0) return true;
+    if (n < 0 && errno == EINTR) continue;
+    if (n < 0) return false;
+    text.append(buffer, static_cast<size_t>(n));
+  }
+}
+
+bool WriteAll(int fd, const std::string& text) {
+  size_t done = 0;
+  while (done < text.size()) {
+    const ssize_t n = write(fd, text.data() + done, text.size() - done);
+    if (n < 0 && errno == EINTR) continue;
+    if (n < 0) return false;
+    done += static_cast<size_t>(n);
+  }
+  return true;
+}
+
+int OpenDirectoryOf(const std::string& path) {
+  std::string directory = Dirname(path);
+  if (directory.empty()) directory = StringStartWith(path, "/") ? "/" : ".";
+  return open(directory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+}
+
+bool WriteTemporary(int fd, const std::string& path, const std::string& text) {
+  struct stat old;
+  const mode_t mode = stat(path.c_str(), &old) == 0 ? (old.st_mode & 07777) : 0644;
+  return fchmod(fd, mode) == 0 && WriteAll(fd, text) && fsync(fd) == 0;
+}
+
+}  // namespace
+
+bool fromString(Json::Value& value, const std::string& text) {
+  if (text.find('\0') != std::string::npos) return false;  // jsoncpp takes it for the end of the text
+  static const Json::CharReaderBuilder builder = MakeReaderBuilder();
+  const std::unique_ptr<Json::CharReader> reader(builder.newCharReader());
+  try {
+    return reader->parse(text.data(), text.data() + text.size(), &value, nullptr);
+  } catch (const Json::Exception&) {
+    return false;  // nested past the limit
+  }
+}
+
+std::string toString(const Json::Value& value) {
+  static const Json::StreamWriterBuilder builder = MakeWriterBuilder();
+  return Json::writeString(builder, value);
+}
+
+bool fromFile(Json::Value& value, const std::string& path) {
+  Descriptor fd(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+  std::string text;
+  return fd.get() >= 0 && ReadAll(fd.get(), text) && fromString(value, text);
+}
+
+bool toFile(const Json::Value& value, const std::string& path) {
+  const Descriptor directory(OpenDirectoryOf(path));  // first: nothing but the disk itself may fail after the rename
+  if (directory.get() < 0) return false;
+  std::string temporary = path + ".XXXXXX";
+  Descriptor fd(mkostemp(temporary.data(), O_CLOEXEC));
+  if (fd.get() < 0) return false;
+  if (WriteTemporary(fd.get(), path, toString(value) + "\n") && fd.Close() &&
+      rename(temporary.c_str(), path.c_str()) == 0) {
+    return fsync(directory.get()) == 0;
+  }
+  const int error = errno;
+  unlink(temporary.c_str());
+  errno = error;
+  return false;
+}
+
+std::string AppendData(const Json::Value& value) {
+  return ", data=" + toString(value);
+}
+
+void JsonApplyChanges(Json::Value& target, const Json::Value& changes) {
+  if (!target.isObject()) target = Json::Value(Json::objectValue);
+  for (const std::string& key : changes.getMemberNames()) {
+    const Json::Value& change = changes[key];
+    if (change.isNull()) {
+      target.removeMember(key);
+    } else if (change.isObject()) {
+      JsonApplyChanges(target[key], change);
+    } else {
+      target[key] = change;
+    }
+  }
+}
+
+}  // namespace quarrox
