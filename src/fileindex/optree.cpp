@@ -1,0 +1,287 @@
+#include "fileindex/optree.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <ostream>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "common/log.h"
+#include "fileindex/optree_event.h"
+#include "fileindex/optree_fold.h"
+
+namespace quarrox::fileindex {
+namespace {
+
+constexpr size_t kReadSize = size_t{256} * 1024;
+// Twenty times what the longest paths and a folder's whole configuration need.
+constexpr size_t kMaxLine = size_t{16} * 1024 * 1024;
+
+// Reads a file line by line into one buffer.
+class LineSource {
+ public:
+  explicit LineSource(const std::string& path) : fd_(open(path.c_str(), O_RDONLY | O_CLOEXEC)) {
+    if (fd_ < 0) error_ = errno;
+  }
+  ~LineSource() {
+    if (fd_ >= 0) close(fd_);
+  }
+  LineSource(const LineSource&) = delete;
+  LineSource& operator=(const LineSource&) = delete;
+
+  // The next line of the buffer; false when there is no whole one left. The text is valid until the next Fill.
+  bool Next(std::string_view& line) {
+    const char* begin = buffer_.data() + begin_;
+    const auto* newline = static_cast<const char*>(memchr(begin + searched_, '\n', end_ - begin_ - searched_));
+    searched_ = 0;
+    if (newline == nullptr && (!at_end_ || begin_ == end_)) {
+      searched_ = end_ - begin_;
+      return false;
+    }
+    line = {begin, newline != nullptr ? static_cast<size_t>(newline - begin) : end_ - begin_};
+    begin_ += line.size() + (newline != nullptr ? 1 : 0);
+    overlong_ = std::exchange(cut_, false);
+    return true;
+  }
+
+  // Whether the line that Next gave is the beginning of one that is longer than kMaxLine.
+  bool overlong() const { return overlong_; }
+
+  // Reads more. False at the end or on an error.
+  bool Fill() {
+    if (at_end_ || error_ != 0) return false;
+    if (searched_ > kMaxLine) {  // only the beginning is kept while the rest goes by
+      cut_ = true;
+      searched_ = kMaxLine;
+      end_ = begin_ + kMaxLine;
+    }
+    if (begin_ > 0) {
+      memmove(buffer_.data(), buffer_.data() + begin_, end_ - begin_);
+      end_ -= begin_;
+      begin_ = 0;
+    }
+    if (buffer_.size() < end_ + kReadSize) buffer_.resize(std::max(buffer_.size() * 2, end_ + kReadSize));
+    ssize_t n;
+    do n = read(fd_, buffer_.data() + end_, buffer_.size() - end_);
+    while (n < 0 && errno == EINTR);
+    if (n < 0) {
+      error_ = errno;
+      return false;
+    }
+    at_end_ = n == 0;
+    end_ += static_cast<size_t>(n);
+    return true;
+  }
+
+  int error() const { return error_; }  // an errno, 0 for none
+
+ private:
+  int fd_;
+  std::vector<char> buffer_ = std::vector<char>(kReadSize);
+  size_t begin_ = 0;
+  size_t end_ = 0;
+  size_t searched_ = 0;  // how much of what is left has no newline
+  bool at_end_ = false;
+  bool cut_ = false;
+  bool overlong_ = false;
+  int error_ = 0;
+};
+
+EventView ViewOf(const Event& event, std::string& data) {
+  if (!event.data.isNull()) data = toString(event.data);
+  return {event.event, event.is_dir, event.path, event.path_old, data};
+}
+
+}  // namespace
+
+// --- operations and nodes ------------------------------------------------------------------------------------------
+
+OP::OP(const std::shared_ptr<OPNode>& node, FileIndexOP op, const std::string& path_old, const Json::Value& data)
+    : node(node), op(op), path_old(path_old), data(data) {}
+
+void OP::MergeData(const Json::Value& other) {
+  MergeFlags(data, other);
+}
+
+std::ostream& operator<<(std::ostream& stream, const OP& op) {
+  const std::shared_ptr<OPNode> node(op.node);
+  stream << (op.op < 10 ? "[0" : "[") << static_cast<int32_t>(op.op) << "] ";
+  if (op.op == kOpRename) stream << op.path_old << " -> ";
+  return stream << node->GetPath() << AppendData(op.data);
+}
+
+OPNode::OPNode(const std::shared_ptr<OPFold>& fold, std::string path) : fold_(fold), path_(std::move(path)) {}
+
+std::shared_ptr<OPNode> OPNode::GetParent() const {
+  const std::shared_ptr<OPFold> fold(fold_);
+  return path_.empty() ? nullptr : fold->View(fold, Dirname(path_));
+}
+
+std::shared_ptr<OPNode> OPNode::GetChild(const std::string& name) const {
+  const std::shared_ptr<OPFold> fold(fold_);
+  const std::string path = path_ + "/" + name;
+  return CanHaveNode(path) && fold->HasNode(path) ? fold->View(fold, path) : nullptr;
+}
+
+void OPNode::TraverseOP(const boost::function<void(std::shared_ptr<OP>)>& fn) {
+  const std::shared_ptr<OPFold> fold(fold_);
+  std::vector<std::shared_ptr<OP>> pending;
+  for (const OPFold::OpId id : fold->PendingAt(path_)) {
+    pending.push_back(newClass<OP>(shared_from_this(), fold->Kind(id), fold->PathOld(id), fold->Data(id)));
+  }
+  for (const std::shared_ptr<OP>& op : pending) fn(op);
+}
+
+std::ostream& operator<<(std::ostream& stream, OPNode& node) {
+  stream << "Node[" << node.GetPath() << "]: ";
+  const char* separator = "";
+  node.TraverseOP([&](const std::shared_ptr<OP>& op) {
+    stream << separator << *op;
+    separator = ", ";
+  });
+  return stream;
+}
+
+// --- the tree ------------------------------------------------------------------------------------------------------
+
+// One line after the other into the fold, bad ones into the log. A good line waits until a few more were read: a
+// queue's paths lie all over the memory, and what a line needs is fetched while the lines before it are worked on.
+class OPTree::LineInserter {
+ public:
+  explicit LineInserter(OPTree& tree) : tree_(tree) {}
+
+  // The text of the line is valid until the next Flush.
+  void Insert(std::string_view line, bool overlong) {
+    ++tree_.counts_.lines;
+    if (log_level == kLogVerbose) QUARROX_LOG_PROGRESS("Got event: %s", log::Text(std::string(line)).c_str());
+    EventView event;
+    if (!overlong && ReadPlainEvent(line, event) && CanHaveNode(event.path)) {
+      Push(event);
+    } else {
+      Flush();
+      InsertSlowly(std::string(line), overlong);
+    }
+  }
+
+  // Inserts what still waits.
+  void Flush() {
+    while (done_ < pushed_) InsertOldest();
+  }
+
+ private:
+  static constexpr size_t kLag = 3;  // lines between two stages
+  static constexpr size_t kWaiting = 16;
+  static_assert(kLag * OPFold::kStages < kWaiting);
+
+  struct Waiting {
+    EventView event;
+    PathKey path;
+  };
+
+  void Push(const EventView& event) {
+    waiting_[pushed_++ % kWaiting] = {event, PathKey(event.path)};
+    for (size_t stage = 0; stage < OPFold::kStages && done_ + stage * kLag < pushed_; ++stage) {
+      tree_.fold_->Prefetch(waiting_[(pushed_ - 1 - stage * kLag) % kWaiting].path, static_cast<int>(stage));
+    }
+    if (pushed_ - done_ > kLag * OPFold::kStages) InsertOldest();
+  }
+
+  void InsertOldest() {
+    const Waiting& waiting = waiting_[done_++ % kWaiting];
+    tree_.fold_->Insert(waiting.event, waiting.path);
+  }
+
+  void InsertSlowly(const std::string& line, bool overlong) {
+    try {
+      if (overlong) throw Error(kErrMalformedEvent, "Line too long: more than " + std::to_string(kMaxLine) + " bytes");
+      tree_.InsertEvent(newClass<Event>(line));
+    } catch (const Error& error) {
+      ++tree_.counts_.bad_lines;
+      QUARROX_SYSLOG_FAILURE_("BuildTree", "InsertEvent failed, event_raw=%s, code=%d, reason=%s",
+                              log::Text(line).c_str(), error.code, log::Text(error.what()).c_str());
+    }
+  }
+
+  OPTree& tree_;
+  std::array<Waiting, kWaiting> waiting_;
+  size_t pushed_ = 0;
+  size_t done_ = 0;
+};
+
+OPTree::OPTree(const std::string& queue_path) : queue_path_(queue_path), fold_(newClass<OPFold>()) {}
+
+OPTree::~OPTree() = default;
+
+void OPTree::BuildTree() {
+  LineSource input(queue_path_);
+  LineInserter inserter(*this);
+  std::string_view line;
+  do {
+    while (input.Next(line)) inserter.Insert(line, input.overlong());
+    inserter.Flush();
+  } while (input.Fill());
+  if (input.error() != 0) {
+    errno = input.error();
+    QUARROX_THROW("!input_stream", kErrSystem, std::string("Failed to open queue, reason=") + strerror(input.error()));
+  }
+}
+
+void OPTree::InsertEvent(const std::shared_ptr<Event>& event) {
+  std::string data;
+  fold_->Insert(ViewOf(*event, data));
+}
+
+std::shared_ptr<OPNode> OPTree::GetNodeByPath(const std::string& path) {
+  if (!CanHaveNode(path)) return nullptr;
+  const std::string node_path = NodePath(path);
+  fold_->MakeNode(node_path);
+  return fold_->View(fold_, node_path);
+}
+
+size_t OPTree::ProcessOP(const boost::function<void(std::shared_ptr<OP>)>& fn) {
+  if (fold_->crashed()) {
+    QUARROX_LOG_PROGRESS("Queue crashed: %s", queue_path_.c_str());
+    fn(newClass<OP>(root(), kOpQueueCrashed, std::string(), Json::Value()));
+    return 1;
+  }
+  const auto entries = static_cast<OPFold::OpId>(fold_->entries());
+  for (OPFold::OpId id = 1; id <= entries; ++id) {
+    const FileIndexOP kind = fold_->Kind(id);
+    if (kind == kOpNone) continue;
+    const std::string path = fold_->Path(id);
+    {
+      const auto op = newClass<OP>(fold_->View(fold_, path), kind, fold_->PathOld(id), fold_->Data(id));
+      fn(op);
+      if (op.use_count() > 1) continue;  // kept by the caller: so is its node
+    }
+    fold_->Release(path);
+  }
+  return entries;
+}
+
+void OPTree::TraverseNodeDescendant(const std::shared_ptr<OPNode>& node,
+                                    const boost::function<void(std::shared_ptr<OPNode>)>& fn, bool recursive) {
+  const std::string prefix = node->GetPath() + "/";
+  std::vector<std::shared_ptr<OPNode>> below;
+  for (const std::string& path : fold_->AllPaths()) {
+    if (!StringStartWith(path, prefix)) continue;
+    if (recursive || path.find('/', prefix.size()) == std::string::npos) below.push_back(fold_->View(fold_, path));
+  }
+  for (const std::shared_ptr<OPNode>& descendant : below) fn(descendant);
+}
+
+std::shared_ptr<OPNode> OPTree::root() {
+  return fold_->View(fold_, std::string());
+}
+
+bool OPTree::queue_crashed() const {
+  return fold_->crashed();
+}
+
+}  // namespace quarrox::fileindex
