@@ -1,0 +1,34 @@
+#include "command.h"
+
+#include <algorithm>
+
+namespace quarrox::ctl {
+
+Arguments::Arguments(const std::vector<std::string>& words, const std::set<std::string>& known_options) {
+  bool options = true;
+  for (const std::string& word : words) {
+    if (options && word == "--") {
+      options = false;
+    } else if (options && word.size() > 1 && word.front() == '-') {
+      if (known_options.count(word) == 0) throw UsageError("unknown option " + word);
+      options_.insert(word);
+    } else {
+      operands_.push_back(word);
+    }
+  }
+}
+
+const std::vector<Command>& Commands() {
+  static const std::vector<Command> commands = {
+      {"queue",
+       "fold",
+       "[--summary] [--json] FILE",
+       "fold a queue file and print each operation that is left",
+       {"--summary", "--json"},
+       1,
+       QueueFold},
+  };
+  return commands;
+}
+
+}  // namespace quarrox::ctl
