@@ -1,0 +1,18 @@
+// What the benchmarks measure with: a piece of work in a process of its own, its CPU time and the memory that it added.
+#pragma once
+
+#include <functional>
+
+namespace quarrox::bench {
+
+struct Cost {
+  double cpu_seconds = 0;  // user and system
+  double wall_seconds = 0;
+  double peak_bytes = 0;  // by how much the peak of resident memory passed what was resident before
+};
+
+// Runs `work` in a child process `runs` times and returns the run with the median CPU time. A child that fails ends the
+// program.
+Cost Measure(const std::function<void()>& work, int runs = 3);
+
+}  // namespace quarrox::bench
