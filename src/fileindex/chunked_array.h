@@ -70,7 +70,6 @@ class TextStore {
     }
     return {p, size};
   }
-  void Prefetch(uint32_t id) const { __builtin_prefetch(chunks_[id / kChunk].get() + id % kChunk); }
 
  private:
   static constexpr size_t kChunk = 2 * kMaxText;

@@ -4,7 +4,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
 #include <cerrno>
 #include <cstring>
 #include <ostream>
@@ -19,7 +18,7 @@
 namespace quarrox::fileindex {
 namespace {
 
-constexpr size_t kReadSize = size_t{256} * 1024;
+constexpr size_t kReadSize = size_t{64} * 1024;
 // Twenty times what the longest paths and a folder's whole configuration need.
 constexpr size_t kMaxLine = size_t{16} * 1024 * 1024;
 
@@ -150,85 +149,37 @@ std::ostream& operator<<(std::ostream& stream, OPNode& node) {
 
 // --- the tree ------------------------------------------------------------------------------------------------------
 
-// One line after the other into the fold, bad ones into the log. A good line waits until a few more were read: a
-// queue's paths lie all over the memory, and what a line needs is fetched while the lines before it are worked on.
-class OPTree::LineInserter {
- public:
-  explicit LineInserter(OPTree& tree) : tree_(tree) {}
-
-  // The text of the line is valid until the next Flush.
-  void Insert(std::string_view line, bool overlong) {
-    ++tree_.counts_.lines;
-    if (log_level == kLogVerbose) QUARROX_LOG_PROGRESS("Got event: %s", log::Text(std::string(line)).c_str());
-    EventView event;
-    if (!overlong && ReadPlainEvent(line, event) && CanHaveNode(event.path)) {
-      Push(event);
-    } else {
-      Flush();
-      InsertSlowly(std::string(line), overlong);
-    }
-  }
-
-  // Inserts what still waits.
-  void Flush() {
-    while (done_ < pushed_) InsertOldest();
-  }
-
- private:
-  static constexpr size_t kLag = 3;  // lines between two stages
-  static constexpr size_t kWaiting = 16;
-  static_assert(kLag * OPFold::kStages < kWaiting);
-
-  struct Waiting {
-    EventView event;
-    PathKey path;
-  };
-
-  void Push(const EventView& event) {
-    waiting_[pushed_++ % kWaiting] = {event, PathKey(event.path)};
-    for (size_t stage = 0; stage < OPFold::kStages && done_ + stage * kLag < pushed_; ++stage) {
-      tree_.fold_->Prefetch(waiting_[(pushed_ - 1 - stage * kLag) % kWaiting].path, static_cast<int>(stage));
-    }
-    if (pushed_ - done_ > kLag * OPFold::kStages) InsertOldest();
-  }
-
-  void InsertOldest() {
-    const Waiting& waiting = waiting_[done_++ % kWaiting];
-    tree_.fold_->Insert(waiting.event, waiting.path);
-  }
-
-  void InsertSlowly(const std::string& line, bool overlong) {
-    try {
-      if (overlong) throw Error(kErrMalformedEvent, "Line too long: more than " + std::to_string(kMaxLine) + " bytes");
-      tree_.InsertEvent(newClass<Event>(line));
-    } catch (const Error& error) {
-      ++tree_.counts_.bad_lines;
-      QUARROX_SYSLOG_FAILURE_("BuildTree", "InsertEvent failed, event_raw=%s, code=%d, reason=%s",
-                              log::Text(line).c_str(), error.code, log::Text(error.what()).c_str());
-    }
-  }
-
-  OPTree& tree_;
-  std::array<Waiting, kWaiting> waiting_;
-  size_t pushed_ = 0;
-  size_t done_ = 0;
-};
-
 OPTree::OPTree(const std::string& queue_path) : queue_path_(queue_path), fold_(newClass<OPFold>()) {}
 
 OPTree::~OPTree() = default;
 
 void OPTree::BuildTree() {
   LineSource input(queue_path_);
-  LineInserter inserter(*this);
   std::string_view line;
   do {
-    while (input.Next(line)) inserter.Insert(line, input.overlong());
-    inserter.Flush();
+    while (input.Next(line)) InsertLine(line, input.overlong());
   } while (input.Fill());
   if (input.error() != 0) {
     errno = input.error();
     QUARROX_THROW("!input_stream", kErrSystem, std::string("Failed to open queue, reason=") + strerror(input.error()));
+  }
+}
+
+void OPTree::InsertLine(std::string_view line, bool overlong) {
+  ++counts_.lines;
+  if (log_level == kLogVerbose) QUARROX_LOG_PROGRESS("Got event: %s", log::Text(std::string(line)).c_str());
+  try {
+    if (overlong) throw Error(kErrMalformedEvent, "Line too long: more than " + std::to_string(kMaxLine) + " bytes");
+    EventView event;
+    if (ReadPlainEvent(line, event)) {
+      fold_->Insert(event);
+    } else {
+      InsertEvent(newClass<Event>(std::string(line)));
+    }
+  } catch (const Error& error) {
+    ++counts_.bad_lines;
+    QUARROX_SYSLOG_FAILURE_("BuildTree", "InsertEvent failed, event_raw=%s, code=%d, reason=%s",
+                            log::Text(std::string(line)).c_str(), error.code, log::Text(error.what()).c_str());
   }
 }
 

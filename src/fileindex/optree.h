@@ -30,6 +30,7 @@
 #include <iosfwd>
 #include <memory>
 #include <string>
+#include <string_view>
 
 #include <boost/function.hpp>
 
@@ -173,7 +174,7 @@ class QUARROX_API OPTree {
   const Counts& counts() const { return counts_; }
 
  private:
-  class LineInserter;
+  void InsertLine(std::string_view line, bool overlong);
 
   std::string queue_path_;
   Counts counts_;

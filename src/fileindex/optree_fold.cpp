@@ -69,7 +69,11 @@ const OPFold::Rule OPFold::kRules[kRows][kKinds] = {
 };
 
 OPFold::OPFold()
-    : moving_(texts_), deletes_(texts_), old_directories_(kOldDirectories), data_(1), ever_deleted_(kFilterBits) {
+    : moving_(texts_, 16384),
+      deletes_(texts_, 1024),
+      old_directories_(kOldDirectories),
+      data_(1),
+      ever_deleted_(kFilterBits) {
   ops_.Add(OpRecord{});
   groups_.Add(Group{});
   extras_.Add(Extra{});
@@ -81,14 +85,10 @@ void OPFold::Insert(const EventView& event) {
   if (!CanHaveNode(event.path)) {
     QUARROX_THROW("!node", kErrInternal, "GetNodeByPath failed, path=" + std::string(event.path));
   }
-  Insert(event, PathKey(event.path));
-}
-
-void OPFold::Insert(const EventView& event, const PathKey& path) {
+  const PathKey path(event.path);
   NewOp op;
   op.data = event.data;
   const uint32_t bits = event.event;
-  if ((bits & kEventQueueDamaged) != 0) crashed_ = true;
   try {
     if ((bits & kEventCreate) != 0) event.is_dir ? HandleReindex(path, op) : HandleCreate(path, op);
     if ((bits & kEventAttr) != 0) HandleAttr(path, op);
@@ -101,10 +101,6 @@ void OPFold::Insert(const EventView& event, const PathKey& path) {
     // More paths or operations than can be numbered: what cannot be told apart any more is the whole share's matter.
     crashed_ = true;
   }
-}
-
-void OPFold::Prefetch(const PathKey& path, int stage) const {
-  if (const uint32_t group = moving_.Prefetch(path, stage); group != 0) __builtin_prefetch(&groups_[group]);
 }
 
 // --- the handlers ------------------------------------------------------------------------------------------------

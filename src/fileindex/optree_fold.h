@@ -38,12 +38,6 @@ class OPFold {
 
   // Throws Error 9999.
   void Insert(const EventView& event);
-  // The same for an event whose path is known to be one; `path` is its key.
-  void Insert(const EventView& event, const PathKey& path);
-
-  // What an event will need is brought nearer, in three stages of which each takes a memory's latency.
-  static constexpr int kStages = 3;
-  void Prefetch(const PathKey& path, int stage) const;
 
   bool crashed() const { return crashed_; }
   size_t entries() const { return ops_.size() - 1; }

@@ -4,7 +4,7 @@
 #include <xxhash.h>
 
 #include <algorithm>
-#include <bit>
+#include <array>
 #include <cstring>
 #include <random>
 #include <utility>
@@ -13,7 +13,7 @@ namespace quarrox::fileindex {
 namespace {
 
 constexpr size_t kFirstSlots = 1024;
-constexpr size_t kKnownDirectories = 4096;
+constexpr size_t kMaxProbes = 8;
 
 // Chosen anew in each process, so that nobody can make up paths that collide.
 uint64_t Seed() {
@@ -29,38 +29,25 @@ uint32_t HashChild(NodeId parent, uint64_t name_hash) {
   return static_cast<uint32_t>(((name_hash ^ parent) * 0x9E3779B97F4A7C15ULL) >> 32);
 }
 
-// The length of the common beginning, eight bytes a step: paths of some thousand components differ in the last.
-size_t CommonPrefix(std::string_view a, std::string_view b) {
-  const size_t size = std::min(a.size(), b.size());
-  size_t i = 0;
-  for (; i + 8 <= size; i += 8) {
-    uint64_t x;
-    uint64_t y;
-    memcpy(&x, a.data() + i, 8);
-    memcpy(&y, b.data() + i, 8);
-    if (x != y) break;
-  }
-  while (i < size && a[i] == b[i]) ++i;
-  return i;
-}
-
 }  // namespace
+
+DirectoryHash::DirectoryHash(std::string_view path) {
+  const XXH128_hash_t hash = XXH3_128bits_withSeed(path.data(), path.size(), Seed());
+  high = hash.high64;
+  low = hash.low64;
+}
 
 PathKey::PathKey(std::string_view path) {
   while (!path.empty() && path.back() == '/') path.remove_suffix(1);
-  path_ = path;
   const auto* slash = static_cast<const char*>(memrchr(path.data(), '/', path.size()));
   const size_t name = slash == nullptr ? 0 : static_cast<size_t>(slash - path.data()) + 1;
   name_ = path.substr(name);
   name_hash_ = HashName(name_);
-  if (name <= 1) return;
-  directory_ = path.substr(0, name - 1);
-  const XXH128_hash_t hash = XXH3_128bits_withSeed(directory_.data(), directory_.size(), Seed());
-  directory_high_ = hash.high64;
-  directory_low_ = hash.low64;
+  directory_ = path.substr(0, name == 0 ? 0 : name - 1);
+  directory_hash_ = DirectoryHash(directory_);
 }
 
-PathTrie::PathTrie(TextStore& names) : names_(names), slots_(kFirstSlots), known_(kKnownDirectories) {
+PathTrie::PathTrie(TextStore& names, size_t directories) : names_(names), slots_(kFirstSlots), known_(directories) {
   const uint32_t no_name = names_.Add("");
   nodes_.Add(Node{});  // 0 is none
   root_ = Add(0, no_name);
@@ -73,44 +60,55 @@ NodeId PathTrie::Add(NodeId parent, uint32_t name) {
   return nodes_.Add(node);
 }
 
-// How many of the remembered steps lead to the same node for `path`.
-size_t PathTrie::SharedSteps(std::string_view path) const {
-  const size_t common = CommonPrefix(path, last_path_);
-  auto step = std::upper_bound(last_steps_.begin(), last_steps_.end(), common,
-                               [](size_t value, const WalkStep& s) { return value < s.end; });
-  // A component that ends just where the paths part may go on in `path`.
-  if (step != last_steps_.begin()) {
-    const size_t end = std::prev(step)->end;
-    if (end == common && end < path.size() && path[end] != '/') --step;
-  }
-  return static_cast<size_t>(step - last_steps_.begin());
-}
-
 NodeId PathTrie::Resolve(const PathKey& path, bool make) {
-  if (path.directory_.empty()) return Walk(path.path_, make);
-  Known& known = known_[path.directory_low_ % kKnownDirectories];
-  if (known.low != path.directory_low_ || known.high != path.directory_high_ || !IsStill(known)) {
-    const NodeId node = Walk(path.directory_, make);
-    if (node == 0) return 0;
-    known = {path.directory_high_, path.directory_low_, node, moves_};
-  }
-  return Step(known.node, path.name_, path.name_hash_, make);
+  const Known& known = KnownAt(path.directory_hash_);
+  const NodeId directory = IsKnown(known, path.directory_hash_) ? known.node : Directory(path, make);
+  if (directory == 0 || path.name_.empty()) return directory;
+  return Step(directory, path.name_, path.name_hash_, make);
 }
 
-uint32_t PathTrie::Prefetch(const PathKey& path, int stage) const {
-  const Known& known = known_[path.directory_low_ % kKnownDirectories];
-  if (known.low != path.directory_low_) return 0;
-  const uint32_t hash = HashChild(known.node, path.name_hash_);
-  const Slot& slot = slots_[hash & (slots_.size() - 1)];
-  if (stage == 0) __builtin_prefetch(&slot);
-  if (stage == 0 || slot.node == 0 || slot.hash != hash) return 0;
-  const Node& node = nodes_[slot.node];
-  if (stage == 1) {
-    __builtin_prefetch(&node);
-    return 0;
+bool PathTrie::IsKnown(const Known& known, const DirectoryHash& hash) const {
+  return known.hash.low == hash.low && known.hash.high == hash.high && IsStill(known);
+}
+
+// From the nearest ancestor that is remembered; else, or where that is too far up, from the root. What is passed on the
+// way is remembered.
+NodeId PathTrie::Directory(const PathKey& path, bool make) {
+  std::array<std::pair<std::string_view, DirectoryHash>, kMaxProbes> missing;
+  size_t count = 0;
+  NodeId node = root_;
+  size_t pos = 0;
+  DirectoryHash hash = path.directory_hash_;
+  for (std::string_view prefix = path.directory_; !prefix.empty(); hash = DirectoryHash(prefix)) {
+    const Known& known = KnownAt(hash);
+    if (IsKnown(known, hash)) {
+      node = known.node;
+      pos = prefix.size();
+      break;
+    }
+    missing[count++] = {prefix, hash};
+    if (count == kMaxProbes) break;
+    prefix = prefix.substr(0, std::min(prefix.rfind('/'), prefix.size()));
   }
-  names_.Prefetch(node.name);
-  return node.payload;
+  while (node != 0 && count > 0) {
+    const auto& [prefix, prefix_hash] = missing[--count];
+    node = StepAlong(node, prefix, pos, make);
+    pos = prefix.size();
+    if (node != 0) KnownAt(prefix_hash) = {prefix_hash, node, moves_};
+  }
+  return node;
+}
+
+NodeId PathTrie::StepAlong(NodeId node, std::string_view path, size_t pos, bool make) {
+  while (node != 0) {
+    while (pos < path.size() && path[pos] == '/') ++pos;
+    if (pos == path.size()) break;
+    const size_t end = std::min(path.find('/', pos), path.size());
+    const std::string_view name = path.substr(pos, end - pos);
+    node = Step(node, name, HashName(name), make);
+    pos = end;
+  }
+  return node;
 }
 
 NodeId PathTrie::Step(NodeId parent, std::string_view name, uint64_t name_hash, bool make) {
@@ -122,37 +120,17 @@ NodeId PathTrie::Step(NodeId parent, std::string_view name, uint64_t name_hash, 
   return child;
 }
 
-NodeId PathTrie::Walk(std::string_view path, bool make) {
-  last_steps_.resize(SharedSteps(path));
-  size_t pos = last_steps_.empty() ? 0 : last_steps_.back().end;
-  NodeId node = last_steps_.empty() ? root_ : last_steps_.back().node;
-  last_path_.resize(pos);
-  while (node != 0) {
-    while (pos < path.size() && path[pos] == '/') ++pos;
-    if (pos == path.size()) break;
-    const size_t end = std::min(path.find('/', pos), path.size());
-    const std::string_view name = path.substr(pos, end - pos);
-    node = Step(node, name, HashName(name), make);
-    pos = end;
-    if (node != 0) last_steps_.push_back({end, node});
-  }
-  const size_t walked = last_steps_.empty() ? 0 : last_steps_.back().end;
-  last_path_.append(path.substr(last_path_.size(), walked - last_path_.size()));
-  return node;
-}
-
 // What was known of the places at and below a node that moves is so no longer.
 void PathTrie::NoteMove(NodeId node) {
-  last_steps_.clear();
   nodes_[node].moved = 1;
   moved_at_[node] = ++moves_;
 }
 
-bool PathTrie::IsStill(Known& known) {
+bool PathTrie::IsStill(const Known& known) const {
   if (known.moves == moves_) return true;
   if (known.node == 0) return false;
   for (NodeId node = known.node; node != 0; node = Parent(node)) {
-    if (nodes_[node].moved != 0 && moved_at_[node] > known.moves) return false;
+    if (nodes_[node].moved != 0 && moved_at_.at(node) > known.moves) return false;
   }
   known.moves = moves_;
   return true;

@@ -20,10 +20,18 @@ namespace quarrox::fileindex {
 
 using NodeId = uint32_t;
 
+// A directory's path as 128 bits, seeded anew in each process: nobody can aim at another's.
+struct DirectoryHash {
+  DirectoryHash() = default;
+  explicit DirectoryHash(std::string_view path);
+
+  uint64_t high = 0;
+  uint64_t low = 0;
+};
+
 // A path and what is computed of it once, for all look-ups.
 class PathKey {
  public:
-  PathKey() = default;
   // An absolute path; empty components count as none. Its text outlives the key.
   explicit PathKey(std::string_view path);
 
@@ -33,11 +41,9 @@ class PathKey {
  private:
   friend class PathTrie;
 
-  std::string_view path_;
-  std::string_view directory_;  // empty where the path is the root or directly below it
-  std::string_view name_;
-  uint64_t directory_high_ = 0;
-  uint64_t directory_low_ = 0;
+  std::string_view directory_;
+  std::string_view name_;  // empty for the root
+  DirectoryHash directory_hash_;
   uint64_t name_hash_ = 0;
 };
 
@@ -45,20 +51,16 @@ class PathTrie {
  public:
   static constexpr int kLanes = 2;
 
-  // The texts are shared with whoever keeps more of them; they outlive the trie.
-  explicit PathTrie(TextStore& names);
+  // The texts are shared with whoever keeps more of them; they outlive the trie. `directories` is how many directories
+  // are remembered (24 bytes each), a power of 2.
+  PathTrie(TextStore& names, size_t directories);
 
   NodeId root() const { return root_; }
 
-  // The node of an absolute path; Find gives 0 where it is missing, Make makes it. Empty components are skipped.
-  // Neither recurses. The last path is remembered, so that a path that shares a beginning with it is not walked from
-  // the root.
+  // The node of a path; Find gives 0 where it is missing, Make makes it. Neither recurses. Directories that were looked
+  // up are remembered, so that a path in one of them costs one step.
   NodeId Find(const PathKey& path) { return Resolve(path, false); }
   NodeId Make(const PathKey& path) { return Resolve(path, true); }
-
-  // Brings nearer what Find will touch: the table's slot (stage 0), the node (1), its name (2). Gives the node's
-  // payload in stage 2, where it was found at once. Changes nothing.
-  uint32_t Prefetch(const PathKey& path, int stage) const;
 
   NodeId Child(NodeId parent, std::string_view name) const;
   NodeId Parent(NodeId node) const { return nodes_[node].parent; }
@@ -118,25 +120,18 @@ class PathTrie {
     uint32_t hash;
     NodeId node;
   };
-  struct WalkStep {
-    size_t end;  // the offset behind the component in last_path_
-    NodeId node;
-  };
-
-  // A directory that was walked to, known by a hash of its path that nobody can aim at: 128 bits with a seed of this
-  // run's.
+  // A directory that was looked up.
   struct Known {
-    uint64_t high;
-    uint64_t low;
+    DirectoryHash hash;
     NodeId node;
-    uint32_t moves;  // valid while neither it nor what it hangs on was moved since
+    mutable uint32_t moves;  // valid while neither it nor what it hangs on was moved since
   };
 
   NodeId Resolve(const PathKey& path, bool make);
-  NodeId Walk(std::string_view path, bool make);
+  NodeId Directory(const PathKey& path, bool make);
+  NodeId StepAlong(NodeId node, std::string_view path, size_t pos, bool make);
   NodeId Step(NodeId parent, std::string_view name, uint64_t name_hash, bool make);
   NodeId Add(NodeId parent, uint32_t name);
-  size_t SharedSteps(std::string_view path) const;
   void AppendChildren(NodeId node, int lane, std::vector<NodeId>& found) const;
 
   bool IsPending(NodeId node, int lane) const { return (nodes_[node].pending >> lane & 1) != 0; }
@@ -152,7 +147,9 @@ class PathTrie {
   void Erase(NodeId node);
   void Grow();
   void NoteMove(NodeId node);
-  bool IsStill(Known& known);
+  Known& KnownAt(const DirectoryHash& hash) { return known_[hash.low & (known_.size() - 1)]; }
+  bool IsKnown(const Known& known, const DirectoryHash& hash) const;
+  bool IsStill(const Known& known) const;
   void SwapPlaces(NodeId a, NodeId b, bool keep_payload);
 
   TextStore& names_;
@@ -160,8 +157,6 @@ class PathTrie {
   std::vector<Slot> slots_;
   size_t used_slots_ = 0;
   NodeId root_;
-  std::string last_path_;
-  std::vector<WalkStep> last_steps_;
   std::vector<Known> known_;
   uint32_t moves_ = 1;
   std::unordered_map<NodeId, uint32_t> moved_at_;
