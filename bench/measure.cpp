@@ -67,10 +67,10 @@ Cost RunInChild(const std::function<void()>& work) {
 
 }  // namespace
 
-Cost Measure(const std::function<void()>& work, int runs) {
+Cost Measure(const std::function<void()>& work, int runs, double Cost::*median_of) {
   std::vector<Cost> costs;
   for (int i = 0; i < runs; ++i) costs.push_back(RunInChild(work));
-  std::sort(costs.begin(), costs.end(), [](const Cost& a, const Cost& b) { return a.cpu_seconds < b.cpu_seconds; });
+  std::sort(costs.begin(), costs.end(), [=](const Cost& a, const Cost& b) { return a.*median_of < b.*median_of; });
   return costs[costs.size() / 2];
 }
 

@@ -11,8 +11,8 @@ struct Cost {
   double peak_bytes = 0;  // by how much the peak of resident memory passed what was resident before
 };
 
-// Runs `work` in a child process `runs` times and returns the run with the median CPU time. A child that fails ends the
-// program.
-Cost Measure(const std::function<void()>& work, int runs = 3);
+// Runs `work` in a child process `runs` times and returns the run with the median of one of its costs. A child that
+// fails ends the program.
+Cost Measure(const std::function<void()>& work, int runs = 3, double Cost::*median_of = &Cost::cpu_seconds);
 
 }  // namespace quarrox::bench

@@ -3,19 +3,21 @@
 // fanotify names a directory by handle, and by the time that is looked up the directory may have moved; events on one
 // name are merged, so that their order is lost. Hence:
 //
-//   1  The renames of a batch are written first, in their order. One with a single end inside the tree is a deletion or
-//   a
-//      creation.
-//   2  Then each touched name is looked at, and what is true now is written: that needs no order.
-//   3  The ends of a rename are looked at too. Where the disk is what the replayed rename says, nothing more is
-//   written. 4  A rename with an end below a directory that moved in the same batch has no exact paths. It is not
-//   written as a
-//      rename: both of its ends are written as looked at, a directory as created, so that the reader looks below it.
-//      The same follows a rename whose source the reader may know as something else.
-//   5  A directory may move between its events and their lookup. Then its rename is in the next batch, as the kernel's
-//      queue is emptied before each lookup, and what was written about paths below its ends may be wrong: it was true
-//      of another directory, and the reader moves it along. So names of the batch before that are below a moved
-//      directory are looked at again, both where their directory is now and where the reader has what it was told.
+// * The renames of a batch are written first, in their order. One with a single end inside the tree is a deletion or a
+// creation.
+//
+// * Then each touched name is looked at, and what is true now is written: that needs no order.
+//
+// * The ends of a rename are looked at too. Where the disk is what the replayed rename says, nothing more is written.
+//
+// * A rename with an end below a directory that moved in the same batch has no exact paths. It is not written as a
+// rename: both of its ends are written as looked at, a directory as created, so that the reader looks below it. The
+// same follows a rename whose source the reader may know as something else.
+//
+// * A directory may move between its events and their lookup. Then its rename is in the next batch, as the kernel's
+// queue is emptied before each lookup, and what was written about paths below its ends may be wrong: it was true of
+// another directory, and the reader moves it along. So names of the batch before that are below a moved directory are
+// looked at again, both where their directory is now and where the reader has what it was told.
 //
 // Whatever cannot be told becomes a line about lost events. Not thread-safe.
 #pragma once

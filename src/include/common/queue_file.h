@@ -14,7 +14,8 @@ namespace quarrox {
 
 // Appends `lines`, whole newline-terminated lines, to the queue at `path`, which is made with mode 0600 where it is
 // absent. Waits in the kernel for the lock. All of `lines` is appended or nothing: a write cut short (a full disk) is
-// undone. Throws Error 502 with the reason "Failed to append to queue, path=PATH, reason=TEXT".
+// undone. Throws Error 502 with the reason "Failed to append to queue, path=PATH, reason=TEXT",
+// which is not logged: whoever tries again says so once.
 QUARROX_API void AppendToQueue(const std::string& path, const std::string& lines);
 
 }  // namespace quarrox
