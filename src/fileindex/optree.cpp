@@ -172,7 +172,7 @@ void OPTree::InsertLine(std::string_view line, bool overlong) {
     if (overlong) throw Error(kErrMalformedEvent, "Line too long: more than " + std::to_string(kMaxLine) + " bytes");
     EventView event;
     if (ReadPlainEvent(line, event)) {
-      fold_->Insert(event);
+      fold_->InsertEvent(event);
     } else {
       InsertEvent(newClass<Event>(std::string(line)));
     }
@@ -185,7 +185,7 @@ void OPTree::InsertLine(std::string_view line, bool overlong) {
 
 void OPTree::InsertEvent(const std::shared_ptr<Event>& event) {
   std::string data;
-  fold_->Insert(ViewOf(*event, data));
+  fold_->InsertEvent(ViewOf(*event, data));
 }
 
 std::shared_ptr<OPNode> OPTree::GetNodeByPath(const std::string& path) {

@@ -4,6 +4,7 @@
 
 #include <cstring>
 
+#include "common/log.h"
 #include "fileindex/optree.h"
 
 namespace quarrox::fileindex {

@@ -79,7 +79,7 @@ OPFold::OPFold()
   extras_.Add(Extra{});
 }
 
-void OPFold::Insert(const EventView& event) {
+void OPFold::InsertEvent(const EventView& event) {
   // Damage counts whatever else is wrong with the line.
   if ((event.event & kEventQueueDamaged) != 0) crashed_ = true;
   if (!CanHaveNode(event.path)) {

@@ -37,7 +37,7 @@ class OPFold {
   OPFold();
 
   // Throws Error 9999.
-  void Insert(const EventView& event);
+  void InsertEvent(const EventView& event);
 
   bool crashed() const { return crashed_; }
   size_t entries() const { return ops_.size() - 1; }

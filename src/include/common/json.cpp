@@ -9,6 +9,7 @@
 #include <memory>
 #include <sstream>
 
+#include "common/log.h"
 #include "common/strings.h"
 
 namespace quarrox {
@@ -123,6 +124,10 @@ bool toFile(const Json::Value& value, const std::string& path) {
 
 std::string AppendData(const Json::Value& value) {
   return ", data=" + toString(value);
+}
+
+void FailGetJsonValue(const char* condition, const std::string& reason, const Json::Value& object) {
+  QUARROX_THROW_IN("GetJsonValue", condition, kErrBadParameter, reason + AppendData(object));
 }
 
 void JsonApplyChanges(Json::Value& target, const Json::Value& changes) {

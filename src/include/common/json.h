@@ -12,7 +12,6 @@
 
 #include "common/error.h"
 #include "common/export.h"
-#include "common/log.h"
 
 namespace quarrox {
 
@@ -33,6 +32,10 @@ QUARROX_API bool toFile(const Json::Value& value, const std::string& path);
 
 // ", data=" and the compact text of the value; ends the reasons of errors.
 QUARROX_API std::string AppendData(const Json::Value& value);
+
+// Logs and throws Error 120 for GetJsonValue.
+[[noreturn]] QUARROX_API void FailGetJsonValue(const char* condition, const std::string& reason,
+                                               const Json::Value& object);
 
 // Whether a value can be read as T, by jsoncpp's own test, and the conversion.
 // T is std::string, bool, int, unsigned int, int64_t, double or Json::Value (which is always true).
@@ -59,20 +62,20 @@ template <> inline Json::Value asJsonType<Json::Value>(const Json::Value& value)
 // clang-format on
 
 // Reads the member `key` of `object` into `out`. Throws Error 120: "Not an object" where it is none, and for a required
-// member "Missing property: KEY" or "Not a string", each followed by AppendData(object). The text says "Not a string"
-// whichever type was wanted: callers know it so. A member that is not required and missing or of another type leaves
-// `out` as it was.
+// member "Missing property: KEY" or "Not a string", each followed by AppendData(object), and logs it. The text says
+// "Not a string" whichever type was wanted: callers know it so. A member that is not required and missing or of another
+// type leaves `out` as it was.
 template <typename T>
 void GetJsonValue(T& out, const Json::Value& object, const std::string& key, bool required) {
-  if (!object.isObject()) throw Error(kErrBadParameter, "Not an object" + AppendData(object));
+  if (!object.isObject()) FailGetJsonValue("!object.isObject()", "Not an object", object);
   const Json::Value* member = object.find(key.data(), key.data() + key.size());
   if (member == nullptr) {
-    if (required) throw Error(kErrBadParameter, "Missing property: " + key + AppendData(object));
-    return;
+    if (!required) return;
+    FailGetJsonValue("!object.isMember(key)", "Missing property: " + key, object);
   }
   if (!isJsonType<T>(*member)) {
-    if (required) throw Error(kErrBadParameter, "Not a string" + AppendData(object));
-    return;
+    if (!required) return;
+    FailGetJsonValue("!isJsonType<T>(object[key])", "Not a string", object);
   }
   out = asJsonType<T>(*member);
 }

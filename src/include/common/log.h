@@ -81,12 +81,15 @@ struct Unit {
 
 // Logs "Failed [condition], reason: reason" and throws Error(code, reason). errno is captured before anything else, so
 // a reason that was built from it must have been built before.
-#define QUARROX_THROW(condition, code, why)                                                          \
+#define QUARROX_THROW(condition, code, why) QUARROX_THROW_IN(__func__, condition, code, why)
+
+// The same in the name of another function.
+#define QUARROX_THROW_IN(function, condition, code, why)                                             \
   do {                                                                                               \
     const int quarrox_throw_errno = errno;                                                           \
     const ::quarrox::Error quarrox_error(code, why);                                                 \
     const std::string quarrox_reason = ::quarrox::log::Text(quarrox_error.reason);                   \
     errno = quarrox_throw_errno;                                                                     \
-    QUARROX_SYSLOG_FAILURE_(__func__, "Failed [%s], reason: %s", condition, quarrox_reason.c_str()); \
+    QUARROX_SYSLOG_FAILURE_(function, "Failed [%s], reason: %s", condition, quarrox_reason.c_str()); \
     throw quarrox_error;                                                                             \
   } while (false)
