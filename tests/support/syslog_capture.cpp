@@ -3,6 +3,7 @@
 #include <cerrno>
 #include <cstdarg>
 #include <cstdio>
+#include <cstdlib>
 #include <mutex>
 
 // <syslog.h> is not included: with fortified headers it defines syslog itself, as an inline call of __syslog_chk.
@@ -16,20 +17,13 @@ std::vector<LogLine> log_lines;
 
 void Log(int priority, const char* format, va_list arguments) {
   const int error = errno;
-  {
-    const std::lock_guard<std::mutex> guard(lock);
-    if (log_recording) {
-      va_list again;
-      va_copy(again, arguments);
-      errno = error;
-      const int size = vsnprintf(nullptr, 0, format, again);  // the C library's printf knows %m
-      va_end(again);
-      std::string text(static_cast<size_t>(size) + 1, '\0');
-      errno = error;
-      vsnprintf(text.data(), text.size(), format, arguments);
-      text.pop_back();
-      log_lines.push_back({priority, format, text, error});
-    }
+  const std::lock_guard<std::mutex> guard(lock);
+  if (log_recording) {
+    char* text = nullptr;
+    errno = error;
+    const int size = vasprintf(&text, format, arguments);  // the C library's printf knows %m
+    log_lines.push_back({priority, format, std::string(text, static_cast<size_t>(size))});
+    free(text);
   }
   errno = error;
 }
@@ -64,14 +58,6 @@ std::vector<std::string> SyslogCapture::texts() const {
 using quarrox::support::Log;
 
 extern "C" {
-
-void vsyslog(int priority, const char* format, va_list arguments) {
-  Log(priority, format, arguments);
-}
-
-void __vsyslog_chk(int priority, int, const char* format, va_list arguments) {
-  Log(priority, format, arguments);
-}
 
 void syslog(int priority, const char* format, ...) {
   va_list arguments;

@@ -10,7 +10,6 @@ struct LogLine {
   int priority;
   std::string format;  // as it was given to syslog
   std::string text;    // as the system log would show it, %m expanded
-  int error;           // errno at the call
 };
 
 // Records what is written to the system log during its lifetime; at most one lives at a time. It starts
