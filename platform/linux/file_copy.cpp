@@ -9,24 +9,11 @@
 #include <cstdlib>
 #include <string>
 
+#include "common/unique_fd.h"
+
+using quarrox::UniqueFd;
+
 namespace {
-
-// A descriptor that closes itself and leaves errno alone.
-class Descriptor {
- public:
-  explicit Descriptor(int fd) : fd_(fd) {}
-  ~Descriptor() {
-    const int error = errno;
-    if (fd_ >= 0) close(fd_);
-    errno = error;
-  }
-  Descriptor(const Descriptor&) = delete;
-  Descriptor& operator=(const Descriptor&) = delete;
-  int get() const { return fd_; }
-
- private:
-  int fd_;
-};
 
 bool WriteAll(int fd, const char* data, size_t size) {
   while (size > 0) {
@@ -72,7 +59,7 @@ bool CopyTo(int to, int from, const struct stat& info) {
 }
 
 int Copy(const char* from, const char* to) {
-  const Descriptor source(open(from, O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+  const UniqueFd source(open(from, O_RDONLY | O_CLOEXEC | O_NONBLOCK));
   struct stat info;
   if (source.get() < 0 || fstat(source.get(), &info) != 0) return -1;
   if (!S_ISREG(info.st_mode)) {
@@ -80,7 +67,7 @@ int Copy(const char* from, const char* to) {
     return -1;
   }
   std::string temporary = std::string(to) + ".XXXXXX";
-  const Descriptor target(mkostemp(temporary.data(), O_CLOEXEC));
+  const UniqueFd target(mkostemp(temporary.data(), O_CLOEXEC));
   if (target.get() < 0) return -1;
   if (CopyTo(target.get(), source.get(), info) && rename(temporary.c_str(), to) == 0) return 0;
   const int error = errno;

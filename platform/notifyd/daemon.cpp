@@ -11,9 +11,9 @@
 
 #include "common/error.h"
 #include "common/log.h"
+#include "common/unique_fd.h"
 #include "queue_writer.h"
 #include "scope.h"
-#include "unique_fd.h"
 #include "watcher.h"
 
 namespace quarrox::notifyd {

@@ -7,7 +7,7 @@
 #include <string>
 #include <unordered_map>
 
-#include "unique_fd.h"
+#include "common/unique_fd.h"
 
 namespace quarrox::notifyd {
 

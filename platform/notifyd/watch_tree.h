@@ -12,8 +12,8 @@
 #include <utility>
 #include <vector>
 
+#include "common/unique_fd.h"
 #include "scope.h"
-#include "unique_fd.h"
 
 namespace quarrox::notifyd {
 

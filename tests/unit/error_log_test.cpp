@@ -66,7 +66,7 @@ TEST(Log, ThrowLogsTheErrnoOfTheFailureAndCutsWhatTheSystemLogWouldDrop) {
   EXPECT_THROW(QUARROX_THROW("0 > fd", kErrSystem, ReasonThatSetsErrno()), Error);
   EXPECT_EQ(errno, 0);
   const std::string reason(300000, 'x');
-  EXPECT_EQ(support::ReasonOf(kErrLockFile, [&] { QUARROX_THROW("!ok", kErrLockFile, reason); }), reason);
+  EXPECT_EQ(support::ReasonOf(kErrLockFile, [&] { QUARROX_THROW_IN("Lock", "!ok", kErrLockFile, reason); }), reason);
 
   ASSERT_EQ(log.lines().size(), 2U);
   EXPECT_EQ(log.lines()[0].format, "%s:%d (%d, %u) (%s) Failed [%s], reason: %s [err: %m]");

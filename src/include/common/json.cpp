@@ -11,6 +11,7 @@
 
 #include "common/log.h"
 #include "common/strings.h"
+#include "common/unique_fd.h"
 
 namespace quarrox {
 namespace {
@@ -29,24 +30,6 @@ Json::StreamWriterBuilder MakeWriterBuilder() {
   builder["emitUTF8"] = true;
   return builder;
 }
-
-// Closes on every road, and says whether closing worked where that matters.
-class Descriptor {
- public:
-  explicit Descriptor(int fd) : fd_(fd) {}
-  ~Descriptor() { Close(); }
-  Descriptor(const Descriptor&) = delete;
-  Descriptor& operator=(const Descriptor&) = delete;
-  int get() const { return fd_; }
-  bool Close() {
-    const int fd = fd_;
-    fd_ = -1;
-    return fd < 0 || close(fd) == 0;
-  }
-
- private:
-  int fd_;
-};
 
 bool ReadAll(int fd, std::string& text) {
   char buffer[65536];
@@ -101,16 +84,16 @@ std::string toString(const Json::Value& value) {
 }
 
 bool fromFile(Json::Value& value, const std::string& path) {
-  Descriptor fd(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+  UniqueFd fd(open(path.c_str(), O_RDONLY | O_CLOEXEC));
   std::string text;
   return fd.get() >= 0 && ReadAll(fd.get(), text) && fromString(value, text);
 }
 
 bool toFile(const Json::Value& value, const std::string& path) {
-  const Descriptor directory(OpenDirectoryOf(path));  // first: nothing but the disk itself may fail after the rename
+  const UniqueFd directory(OpenDirectoryOf(path));  // first: nothing but the disk itself may fail after the rename
   if (directory.get() < 0) return false;
   std::string temporary = path + ".XXXXXX";
-  Descriptor fd(mkostemp(temporary.data(), O_CLOEXEC));
+  UniqueFd fd(mkostemp(temporary.data(), O_CLOEXEC));
   if (fd.get() < 0) return false;
   if (WriteTemporary(fd.get(), path, toString(value) + "\n") && fd.Close() &&
       rename(temporary.c_str(), path.c_str()) == 0) {

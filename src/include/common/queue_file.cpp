@@ -9,6 +9,7 @@
 #include <cstring>
 
 #include "common/error.h"
+#include "common/unique_fd.h"
 
 namespace quarrox {
 namespace {
@@ -23,30 +24,23 @@ class LockedQueue {
  public:
   explicit LockedQueue(const std::string& path)
       : fd_(open(path.c_str(), O_RDWR | O_APPEND | O_CREAT | O_CLOEXEC, 0600)) {
-    if (fd_ < 0) Fail(path);
+    if (!fd_) Fail(path);
     int result;
-    do result = flock(fd_, LOCK_EX);
+    do result = flock(fd(), LOCK_EX);
     while (result != 0 && errno == EINTR);
-    if (result == 0) return;
-    const int error = errno;
-    close(fd_);
-    errno = error;
-    Fail(path);
+    if (result != 0) Fail(path);
   }
-  ~LockedQueue() { close(fd_); }
-  LockedQueue(const LockedQueue&) = delete;
-  LockedQueue& operator=(const LockedQueue&) = delete;
 
-  int fd() const { return fd_; }
+  int fd() const { return fd_.get(); }
   bool IsStillAt(const std::string& path) const {
     struct stat mine;
     struct stat there;
-    return fstat(fd_, &mine) == 0 && stat(path.c_str(), &there) == 0 && mine.st_dev == there.st_dev &&
+    return fstat(fd(), &mine) == 0 && stat(path.c_str(), &there) == 0 && mine.st_dev == there.st_dev &&
            mine.st_ino == there.st_ino;
   }
 
  private:
-  int fd_;
+  UniqueFd fd_;
 };
 
 // A producer that died in the middle of a line leaves it torn; the next line must not be glued to it.
