@@ -176,7 +176,9 @@ void InotifyWatcher::Rename(const Departure& from, const Spot& to) {
   if (!from.is_dir) return;
   unsure_.push_back(from.spot);
   unsure_.push_back(to);
-  if (!known) Created(to, true);  // it was not watched at its old place, so what is below is not known
+  // Where it was not watched at its old place, what is below is not known. Where it was found below a new directory,
+  // only that one was reported, and the reader, looking there, will not find it any more.
+  if (!known || tree_->WasFound(tree_->Find(to))) Created(to, true);
 }
 
 void InotifyWatcher::MovedOut(const Departure& departure) {

@@ -62,6 +62,7 @@ void WatchTree::WatchAll() {
   }
   nodes_[root_];
   WatchBelow(root_);
+  for (auto& [wd, node] : nodes_) node.found = false;
 }
 
 // Opens a known directory. No descriptor where something else is at its path by now.
@@ -149,7 +150,9 @@ void WatchTree::WatchSubdirectories(int wd, std::vector<int>& added) {
   while (const dirent* entry = readdir(dir.get())) {
     if (IsDots(entry->d_name) || !IsDirectory(*entry, fd.get()) || !scope_.IsInside(path, entry->d_name)) continue;
     const int child = WatchEntry(fd, {wd, entry->d_name});
-    if (child >= 0) added.push_back(child);
+    if (child < 0) continue;
+    nodes_.at(child).found = true;
+    added.push_back(child);
   }
   nodes_.at(wd).scanned = true;
 }

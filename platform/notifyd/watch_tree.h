@@ -49,6 +49,10 @@ class WatchTree {
   std::string Path(int wd) const;
   std::string Path(const Spot& spot) const { return Join(Path(spot.parent), spot.name); }
 
+  // Whether what is below the known directory `wd` was never reported for itself, but with one above that was looked
+  // through. Not so for what stood there when watching began.
+  bool WasFound(int wd) const { return nodes_.at(wd).found; }
+
   // Moves the directory known at `from` with all below; false where there is none.
   bool Move(const Spot& from, const Spot& to);
   // Forgets the directory known at `spot` and all below, and ends their watches.
@@ -69,6 +73,7 @@ class WatchTree {
     int parent = -1;
     std::string name;
     bool scanned = false;  // its subdirectories were looked for
+    bool found = false;    // by looking below another, which alone was reported
     std::map<std::string, int> children;
   };
 
