@@ -1,13 +1,32 @@
 #include "vexo/error.h"
 
+#include <cstring>
+
 namespace {
-thread_local int last_error = VEXO_ERR_NONE;
+
+struct LastError {
+  int number = VEXO_ERR_NONE;
+  const char* file = "";
+  int line = 0;
+};
+
+thread_local LastError last;
+
 }  // namespace
 
 int VLIBCErrGet(void) {
-  return last_error;
+  return last.number;
 }
 
-void VLIBCErrSet(int error) {
-  last_error = error;
+const char* VLIBCErrFileGet(void) {
+  return last.file;
+}
+
+int VLIBCErrLineGet(void) {
+  return last.line;
+}
+
+void VLIBCErrSetAt(int error, const char* file, int line) {
+  const char* slash = strrchr(file, '/');
+  last = {error, slash == nullptr ? file : slash + 1, line};
 }
