@@ -22,7 +22,7 @@ add_dependencies(fileindex common fileindex_core)
 # What a user of the library includes: the public headers name jsoncpp and Boost, both found by name.
 install(TARGETS fileindex EXPORT fileindexTargets LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR})
 install(DIRECTORY include/common DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/quarrox FILES_MATCHING PATTERN "*.h")
-install(FILES fileindex/optree.h DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/quarrox/fileindex)
+install(FILES fileindex/optree.h fileindex/util.h DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/quarrox/fileindex)
 install(EXPORT fileindexTargets NAMESPACE fileindex:: DESTINATION ${CMAKE_INSTALL_LIBDIR}/cmake/fileindex)
 include(CMakePackageConfigHelpers)
 write_basic_package_version_file(${CMAKE_CURRENT_BINARY_DIR}/fileindexConfigVersion.cmake COMPATIBILITY SameMajorVersion)

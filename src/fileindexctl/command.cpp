@@ -18,6 +18,10 @@ Arguments::Arguments(const std::vector<std::string>& words, const std::set<std::
   }
 }
 
+std::string NameOf(const Command& command) {
+  return *command.verb == '\0' ? command.noun : std::string(command.noun) + ' ' + command.verb;
+}
+
 const std::vector<Command>& Commands() {
   static const std::vector<Command> commands = {
       {"queue",
@@ -27,6 +31,15 @@ const std::vector<Command>& Commands() {
        {"--summary", "--json"},
        1,
        QueueFold},
+      {"share", "list", "[--json]", "list the shares and whether they can be indexed", {"--json"}, 0, ShareList},
+      {"share", "show", "[--json] NAME", "say all about one share", {"--json"}, 1, ShareShow},
+      {"explain",
+       "",
+       "[--json] PATH",
+       "say which share a path belongs to, and whether it is indexed or why not",
+       {"--json"},
+       1,
+       ExplainPath},
   };
   return commands;
 }

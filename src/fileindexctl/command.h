@@ -19,7 +19,7 @@ class UsageError : public std::runtime_error {
   using std::runtime_error::runtime_error;
 };
 
-// The words behind NOUN VERB, options apart from the rest. "--" ends the options.
+// The words behind a command, options apart from the rest. "--" ends the options.
 class Arguments {
  public:
   Arguments(const std::vector<std::string>& words, const std::set<std::string>& known_options);
@@ -34,17 +34,23 @@ class Arguments {
 
 struct Command {
   const char* noun;
-  const char* verb;
-  const char* synopsis;  // what follows the verb
+  const char* verb;      // empty for a command of one word
+  const char* synopsis;  // what follows
   const char* help;      // one line
   std::set<std::string> options;
   size_t operands;  // how many it takes
   int (*run)(const Arguments& arguments);
 };
 
+// The words that name a command.
+std::string NameOf(const Command& command);
+
 // Every command, in the order of the help.
 const std::vector<Command>& Commands();
 
 int QueueFold(const Arguments& arguments);
+int ShareList(const Arguments& arguments);
+int ShareShow(const Arguments& arguments);
+int ExplainPath(const Arguments& arguments);
 
 }  // namespace quarrox::ctl

@@ -3,23 +3,26 @@
 #include <cstdio>
 #include <exception>
 #include <iostream>
+#include <map>
 #include <string>
 #include <vector>
 
 #include "command.h"
 #include "common/error.h"
 #include "common/json.h"
+#include "output.h"
 
 namespace {
 
 using quarrox::ctl::Arguments;
 using quarrox::ctl::Command;
 using quarrox::ctl::Commands;
+using quarrox::ctl::NameOf;
 
 void PrintHelp(std::ostream& out) {
-  out << "usage: fileindexctl NOUN VERB [options]\n\n";
+  out << "usage: fileindexctl COMMAND [options]\n\n";
   for (const Command& command : Commands()) {
-    out << "  " << command.noun << ' ' << command.verb << ' ' << command.synopsis << "\n      " << command.help << '\n';
+    out << "  " << NameOf(command) << ' ' << command.synopsis << "\n      " << command.help << '\n';
   }
   out << "\n--json prints one JSON object, or one a line for listings.\n"
          "Exit status: 0 done, 1 failed, 2 bad usage.\n";
@@ -30,6 +33,17 @@ int Usage(const std::string& what) {
   return quarrox::ctl::kUsage;
 }
 
+// What a person may make of an error's number; empty where the reason says all.
+const char* MeaningOf(int code) {
+  static const std::map<int, const char*> meanings = {
+      {quarrox::kErrShareEnum, "the shares cannot be listed"},
+      {quarrox::kErrNoSuchShare, "there is no such share"},
+      {quarrox::kErrNoSuchFolder, "there is no such folder"},
+  };
+  const auto meaning = meanings.find(code);
+  return meaning == meanings.end() ? "" : meaning->second;
+}
+
 int Fail(int code, const std::string& reason, bool json) {
   if (json) {
     Json::Value failure;
@@ -38,7 +52,11 @@ int Fail(int code, const std::string& reason, bool json) {
     failure["error"]["msg"] = reason;
     std::cout << quarrox::toString(failure) << '\n';
   } else {
-    std::cerr << "fileindexctl: error " << code << (reason.empty() ? "" : ": " + reason) << '\n';
+    std::cerr << "fileindexctl: error " << code;
+    for (const std::string& text : {std::string(MeaningOf(code)), reason}) {
+      if (!text.empty()) std::cerr << ": " << quarrox::ctl::Visible(text);
+    }
+    std::cerr << '\n';
   }
   return quarrox::ctl::kFailed;
 }
@@ -47,7 +65,7 @@ int Run(const Command& command, const std::vector<std::string>& words) {
   try {
     const Arguments arguments(words, command.options);
     if (arguments.operands().size() != command.operands) {
-      return Usage(std::string("usage: fileindexctl ") + command.noun + ' ' + command.verb + ' ' + command.synopsis);
+      return Usage("usage: fileindexctl " + NameOf(command) + ' ' + command.synopsis);
     }
     try {
       const int status = command.run(arguments);
@@ -71,13 +89,16 @@ int main(int argc, char** argv) {
     PrintHelp(std::cout);
     return quarrox::ctl::kDone;
   }
-  if (words.size() < 2) return Usage("NOUN and VERB are missing");
+  if (words.empty()) return Usage("a command is missing");
   const auto command = std::find_if(Commands().begin(), Commands().end(), [&](const Command& candidate) {
-    return words[0] == candidate.noun && words[1] == candidate.verb;
+    return words[0] == candidate.noun && (*candidate.verb == '\0' || (words.size() > 1 && words[1] == candidate.verb));
   });
-  if (command == Commands().end()) return Usage("unknown command '" + words[0] + " " + words[1] + "'");
+  if (command == Commands().end()) {
+    return Usage("unknown command '" + words[0] + (words.size() > 1 ? " " + words[1] : "") + "'");
+  }
+  const long own_words = *command->verb == '\0' ? 1 : 2;
   try {
-    return Run(*command, {words.begin() + 2, words.end()});
+    return Run(*command, {words.begin() + own_words, words.end()});
   } catch (const std::exception& error) {
     std::cerr << "fileindexctl: " << error.what() << '\n';
     return quarrox::ctl::kFailed;

@@ -6,30 +6,13 @@
 #include "command.h"
 #include "common/json.h"
 #include "fileindex/optree.h"
+#include "output.h"
 
 namespace quarrox::ctl {
 namespace {
 
 using fileindex::OP;
 using fileindex::OPTree;
-
-// One operation stays one line, and a file name cannot drive the terminal: control bytes come out as \n, \x1b and so
-// on.
-std::string Visible(const std::string& text) {
-  static constexpr char kHex[] = "0123456789abcdef";
-  std::string result;
-  for (const char c : text) {
-    const auto byte = static_cast<unsigned char>(c);
-    if (c == '\n') {
-      result += "\\n";
-    } else if (byte < 0x20 || byte == 0x7f) {
-      result.append("\\x").append(1, kHex[byte >> 4]).append(1, kHex[byte & 15]);
-    } else {
-      result += c;
-    }
-  }
-  return result;
-}
 
 std::string AsText(const OP& op) {
   std::ostringstream stream;

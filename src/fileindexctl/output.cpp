@@ -1,0 +1,44 @@
+#include "output.h"
+
+#include <algorithm>
+#include <ostream>
+
+namespace quarrox::ctl {
+namespace {
+
+// The columns that a text takes: its characters, as far as it is UTF-8.
+size_t Width(const std::string& text) {
+  return static_cast<size_t>(
+      std::count_if(text.begin(), text.end(), [](char c) { return (static_cast<unsigned char>(c) & 0xc0) != 0x80; }));
+}
+
+}  // namespace
+
+std::string Visible(const std::string& text) {
+  static constexpr char kHex[] = "0123456789abcdef";
+  std::string result;
+  for (const char c : text) {
+    const auto byte = static_cast<unsigned char>(c);
+    if (c == '\n') {
+      result += "\\n";
+    } else if (byte < 0x20 || byte == 0x7f) {
+      result.append("\\x").append(1, kHex[byte >> 4]).append(1, kHex[byte & 15]);
+    } else {
+      result += c;
+    }
+  }
+  return result;
+}
+
+void PrintTable(std::ostream& out, const std::vector<std::vector<std::string>>& rows) {
+  std::vector<size_t> widths(rows.front().size());
+  for (const auto& row : rows) {
+    for (size_t i = 0; i < row.size(); ++i) widths[i] = std::max(widths[i], Width(row[i]));
+  }
+  for (const auto& row : rows) {
+    for (size_t i = 0; i + 1 < row.size(); ++i) out << row[i] << std::string(widths[i] - Width(row[i]) + 2, ' ');
+    out << row.back() << '\n';
+  }
+}
+
+}  // namespace quarrox::ctl

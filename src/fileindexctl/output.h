@@ -1,0 +1,16 @@
+// What the commands print: tables for people, one JSON object a line for programs.
+#pragma once
+
+#include <iosfwd>
+#include <string>
+#include <vector>
+
+namespace quarrox::ctl {
+
+// A text that stays on one line and cannot drive the terminal: control bytes come out as \n, \x1b and so on.
+std::string Visible(const std::string& text);
+
+// Rows of equally many texts, the first of which is the heading. Columns are as wide as their widest text.
+void PrintTable(std::ostream& out, const std::vector<std::vector<std::string>>& rows);
+
+}  // namespace quarrox::ctl
