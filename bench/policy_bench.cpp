@@ -15,7 +15,7 @@
 
 #include "common/sdk/share.h"
 #include "fileindex/util.h"
-#include "support/private_etc.h"
+#include "support/private_machine.h"
 
 namespace {
 
@@ -94,7 +94,7 @@ int main(int argc, char** argv) {
     fflush(stdout);
     const pid_t child = fork();  // each list in an /etc of its own
     if (child == 0) {
-      support::PrivateEtc etc;
+      support::PrivateMachine etc;
       if (etc.Enter())
         Measure(shares, small ? 200 : 20000, etc.scratch());
       else

@@ -1,11 +1,12 @@
 #include "contract/world.h"
-#include "support/private_etc.h"
+#include "support/private_machine.h"
 
 namespace quarrox::contract {
 
 std::string Volume() {
-  static support::PrivateEtc etc;
-  static const bool entered = geteuid() == 0 && etc.Enter() && std::filesystem::create_directories("/etc/vexo");
+  static support::PrivateMachine etc;
+  static const bool entered = geteuid() == 0 && etc.Enter();
+  if (entered) std::filesystem::create_directories("/etc/vexo");
   return entered ? etc.scratch() : "";
 }
 

@@ -6,9 +6,11 @@
 #include <gtest/gtest.h>
 
 #include "contract/world.h"
+#include "vexo/notifyd.h"
 #include "vexo/path_compose.h"
 #include "vexo/quota.h"
 #include "vexo/recycle.h"
+#include "vexo/service.h"
 #include "vexo/share.h"
 #include "vexo/smb.h"
 #include "vexo/user.h"
@@ -101,6 +103,29 @@ TEST_F(PlatformContract, TheMachineAnswersAndItsUsersCanBeTaken) {
                    VEXOQuotaIsEnough(0, docs.c_str(), 1, 0), VEXOQuotaIsEnough(0, vault.c_str(), 1ULL << 62, 0),
                    VLIBCErrGet(), VEXOSMBSetSpotlight(1), VEXOSMBIsEnableSpotlight()}),
       (std::vector<int>{1, 0, 0, VEXO_FS_PSEUDO, 0, 1, 1, 0, 1, 0, VEXO_ERR_VOLUME_FULL, 0, 1}));
+}
+
+TEST_F(PlatformContract, SharesAreListedAndMonitorsStored) {
+  VLIBC_SZLIST* list = VLIBCSzListAlloc(1);
+  EXPECT_EQ(VLIBShareEnum(&list, [](const VEXO_SHARE* share) { return share->szName[0] == 'p' ? 1 : 0; }), 5);
+  EXPECT_EQ(std::string(VLIBCSzListGet(list, 4)) + VLIBCSzListGet(list, 1), long_ + "docs");
+  EXPECT_TRUE(VLIBCSzListGet(list, 5) == nullptr && VLIBCSzListGet(list, -1) == nullptr);
+  VLIBCSzListFree(list);
+  using namespace VEXO::VEXONOTIFYD;
+  const auto upsert = [](const Json::Value& config) {
+    return MonitorQueue::Upsert(MonitorQueue(config), "test", MONITOR_QUEUE_TYPE_APPLICATION);
+  };
+  Json::Value config;
+  config["queue"] = (volume_ / "@fileindex/docs/queue").string();
+  config["config"][0]["path"] = (volume_ / "docs").string();
+  EXPECT_FALSE(upsert(config));
+  EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_BAD_PARAMETER);
+  config["config"][0]["mask"] = 1;
+  EXPECT_TRUE(upsert(config) && std::filesystem::is_directory(volume_ / "@fileindex/docs"));
+  for (int i = 0; i < 2; ++i) {
+    EXPECT_TRUE(MonitorQueue::Delete(config["queue"].asString(), "test", MONITOR_QUEUE_TYPE_APPLICATION));
+  }
+  EXPECT_EQ(VLIBServiceStart("vexocontentextractd", TRUE), 0);
 }
 
 }  // namespace

@@ -5,8 +5,8 @@
     machine.write("/etc/vexo/shares.conf", "[docs]\npath = %s/docs\n" % machine.SCRATCH)
     status, lines = machine.ctl("share", "list")      # fileindexctl with --json
 
-/etc is a copy of the machine's own, in which /etc/vexo and /etc/samba are empty. SCRATCH is an empty tmpfs. Everything
-else is the real machine: it is not to be written to.
+/etc is a copy of the machine's own, in which /etc/vexo and /etc/samba are empty. SCRATCH, /var, /run and /tmp are empty,
+but for the directories that every machine has in /var. Everything else is the real machine: it is not to be written to.
 """
 import json
 import os
@@ -28,6 +28,11 @@ def enter():
     # Not an overlay: an ordinary user could not write what the real root owns.
     subprocess.run(["cp", "-RP", "--preserve=mode", "/etc", SCRATCH + "/.etc"], stderr=subprocess.DEVNULL)
     run("mount", "--bind", SCRATCH + "/.etc", "/etc")
+    for place in ("/var", "/run", "/tmp"):
+        run("mount", "-t", "tmpfs", "-o", "mode=1777", "scratch", place)
+    os.symlink("/run", "/var/run")
+    for directory in ("/var/lib", "/var/tmp", "/var/log"):
+        os.makedirs(directory)
     for directory in ("/etc/vexo", "/etc/samba"):
         shutil.rmtree(directory, ignore_errors=True)
         os.makedirs(directory)

@@ -1,4 +1,4 @@
-// An /etc and a /var/lib that may be written to without touching the machine's own: for tests of fixed paths.
+// An /etc, a /var, a /run and a /tmp that may be written to without touching the machine's own: for tests of fixed paths.
 #pragma once
 
 #include <sched.h>
@@ -11,7 +11,7 @@
 
 namespace quarrox::support {
 
-class PrivateEtc {
+class PrivateMachine {
  public:
   // Takes the calling thread, and the threads and processes that it starts from then on, into a mount namespace of
   // their own, as an ordinary user into one where it is root. Copies of what was there are written to; they and the
@@ -27,13 +27,15 @@ class PrivateEtc {
     }
     return mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0 &&
            mount("scratch", kMemory, "tmpfs", 0, "mode=0755") == 0 && std::filesystem::create_directory(scratch()) &&
-           Overlay("/etc", "etc") && Overlay("/var/lib", "lib");
+           Overlay("/etc", "etc") && Overlay("/var", "var") && Empty("/run") && Empty("/tmp");
   }
 
   std::string scratch() const { return std::string(kMemory) + "/scratch"; }
 
  private:
   static constexpr char kMemory[] = "/mnt";  // there on every machine
+
+  static bool Empty(const char* dir) { return mount("scratch", dir, "tmpfs", 0, "mode=1777") == 0; }
 
   static bool Overlay(const char* dir, const std::string& name) {
     const std::string upper = kMemory + ("/" + name), work = upper + ".work";
