@@ -1,4 +1,5 @@
-// An /etc, a /var, a /run and a /tmp that may be written to without touching the machine's own: for tests of fixed paths.
+// An /etc, a /var, a /run and a /tmp that may be written to without touching the machine's own: for tests of fixed
+// paths.
 #pragma once
 
 #include <sched.h>

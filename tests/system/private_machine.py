@@ -28,14 +28,19 @@ def enter():
     # Not an overlay: an ordinary user could not write what the real root owns.
     subprocess.run(["cp", "-RP", "--preserve=mode", "/etc", SCRATCH + "/.etc"], stderr=subprocess.DEVNULL)
     run("mount", "--bind", SCRATCH + "/.etc", "/etc")
+    build = os.environ["FILEINDEX_BUILD_DIR"]
+    kept = os.open(build, os.O_PATH)
     for place in ("/var", "/run", "/tmp"):
         run("mount", "-t", "tmpfs", "-o", "mode=1777", "scratch", place)
+    if not os.path.exists(build):  # a tree that somebody has there stays in sight
+        os.makedirs(build)
+        run("mount", "-c", "--bind", "/proc/%d/fd/%d" % (os.getpid(), kept), build)
     os.symlink("/run", "/var/run")
     for directory in ("/var/lib", "/var/tmp", "/var/log"):
-        os.makedirs(directory)
+        os.makedirs(directory, exist_ok=True)
     for directory in ("/etc/vexo", "/etc/samba"):
         shutil.rmtree(directory, ignore_errors=True)
-        os.makedirs(directory)
+        os.makedirs(directory, exist_ok=True)
 
 
 def write(path, content=""):
