@@ -1,9 +1,5 @@
 #include "fileindex/optree.h"
 
-#include <fcntl.h>
-#include <unistd.h>
-
-#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <ostream>
@@ -12,85 +8,12 @@
 #include <vector>
 
 #include "common/log.h"
+#include "common/queue_file.h"
 #include "fileindex/optree_event.h"
 #include "fileindex/optree_fold.h"
 
 namespace quarrox::fileindex {
 namespace {
-
-constexpr size_t kReadSize = size_t{64} * 1024;
-// Twenty times what the longest paths and a folder's whole configuration need.
-constexpr size_t kMaxLine = size_t{16} * 1024 * 1024;
-
-// Reads a file line by line into one buffer.
-class LineSource {
- public:
-  explicit LineSource(const std::string& path) : fd_(open(path.c_str(), O_RDONLY | O_CLOEXEC)) {
-    if (fd_ < 0) error_ = errno;
-  }
-  ~LineSource() {
-    if (fd_ >= 0) close(fd_);
-  }
-  LineSource(const LineSource&) = delete;
-  LineSource& operator=(const LineSource&) = delete;
-
-  // The next line of the buffer; false when there is no whole one left. The text is valid until the next Fill.
-  bool Next(std::string_view& line) {
-    const char* begin = buffer_.data() + begin_;
-    const auto* newline = static_cast<const char*>(memchr(begin + searched_, '\n', end_ - begin_ - searched_));
-    searched_ = 0;
-    if (newline == nullptr && (!at_end_ || begin_ == end_)) {
-      searched_ = end_ - begin_;
-      return false;
-    }
-    line = {begin, newline != nullptr ? static_cast<size_t>(newline - begin) : end_ - begin_};
-    begin_ += line.size() + (newline != nullptr ? 1 : 0);
-    overlong_ = std::exchange(cut_, false);
-    return true;
-  }
-
-  // Whether the line that Next gave is the beginning of one that is longer than kMaxLine.
-  bool overlong() const { return overlong_; }
-
-  // Reads more. False at the end or on an error.
-  bool Fill() {
-    if (at_end_ || error_ != 0) return false;
-    if (searched_ > kMaxLine) {  // only the beginning is kept while the rest goes by
-      cut_ = true;
-      searched_ = kMaxLine;
-      end_ = begin_ + kMaxLine;
-    }
-    if (begin_ > 0) {
-      memmove(buffer_.data(), buffer_.data() + begin_, end_ - begin_);
-      end_ -= begin_;
-      begin_ = 0;
-    }
-    if (buffer_.size() < end_ + kReadSize) buffer_.resize(std::max(buffer_.size() * 2, end_ + kReadSize));
-    ssize_t n;
-    do n = read(fd_, buffer_.data() + end_, buffer_.size() - end_);
-    while (n < 0 && errno == EINTR);
-    if (n < 0) {
-      error_ = errno;
-      return false;
-    }
-    at_end_ = n == 0;
-    end_ += static_cast<size_t>(n);
-    return true;
-  }
-
-  int error() const { return error_; }  // an errno, 0 for none
-
- private:
-  int fd_;
-  std::vector<char> buffer_ = std::vector<char>(kReadSize);
-  size_t begin_ = 0;
-  size_t end_ = 0;
-  size_t searched_ = 0;  // how much of what is left has no newline
-  bool at_end_ = false;
-  bool cut_ = false;
-  bool overlong_ = false;
-  int error_ = 0;
-};
 
 EventView ViewOf(const Event& event, std::string& data) {
   if (!event.data.isNull()) data = toString(event.data);
@@ -154,11 +77,9 @@ OPTree::OPTree(const std::string& queue_path) : queue_path_(queue_path), fold_(n
 OPTree::~OPTree() = default;
 
 void OPTree::BuildTree() {
-  LineSource input(queue_path_);
+  QueueLines input(queue_path_);
   std::string_view line;
-  do {
-    while (input.Next(line)) InsertLine(line, input.overlong());
-  } while (input.Fill());
+  while (input.Next(line)) InsertLine(line, input.overlong());
   if (input.error() != 0) {
     errno = input.error();
     QUARROX_THROW("!input_stream", kErrSystem, std::string("Failed to open queue, reason=") + strerror(input.error()));
@@ -169,7 +90,9 @@ void OPTree::InsertLine(std::string_view line, bool overlong) {
   ++counts_.lines;
   if (log_level == kLogVerbose) QUARROX_LOG_PROGRESS("Got event: %s", log::Text(std::string(line)).c_str());
   try {
-    if (overlong) throw Error(kErrMalformedEvent, "Line too long: more than " + std::to_string(kMaxLine) + " bytes");
+    if (overlong) {
+      throw Error(kErrMalformedEvent, "Line too long: more than " + std::to_string(QueueLines::kMaxLine) + " bytes");
+    }
     EventView event;
     if (ReadPlainEvent(line, event)) {
       fold_->InsertEvent(event);

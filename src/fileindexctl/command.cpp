@@ -1,21 +1,56 @@
 #include "command.h"
 
-#include <algorithm>
+#include <charconv>
+#include <iterator>
+#include <system_error>
 
 namespace quarrox::ctl {
 
+namespace {
+bool IsDigit(char c) {
+  return '0' <= c && c <= '9';
+}
+}  // namespace
+
 Arguments::Arguments(const std::vector<std::string>& words, const std::set<std::string>& known_options) {
   bool options = true;
-  for (const std::string& word : words) {
-    if (options && word == "--") {
-      options = false;
-    } else if (options && word.size() > 1 && word.front() == '-') {
-      if (known_options.count(word) == 0) throw UsageError("unknown option " + word);
-      options_.insert(word);
+  for (auto word = words.begin(); word != words.end(); ++word) {
+    if (!options || word->size() < 2 || word->front() != '-' || IsDigit((*word)[1])) {
+      operands_.push_back(*word);
+      continue;
+    }
+    options = *word != "--";
+    if (!options) continue;
+    const size_t equals = word->find('=');
+    const std::string option = word->substr(0, equals);
+    std::string& value = options_[option];
+    if (known_options.count(option + "=") == 0) {
+      if (known_options.count(option) == 0) throw UsageError("unknown option " + option);
+      if (equals != std::string::npos) throw UsageError("option " + option + " takes no value");
+    } else if (equals != std::string::npos) {
+      value = word->substr(equals + 1);
     } else {
-      operands_.push_back(word);
+      if (std::next(word) == words.end()) throw UsageError("option " + option + " needs a value");
+      value = *++word;
     }
   }
+}
+
+std::string Arguments::Value(const std::string& option, const std::string& otherwise) const {
+  const auto found = options_.find(option);
+  return found == options_.end() ? otherwise : found->second;
+}
+
+size_t Arguments::Number(const std::string& option, size_t otherwise) const {
+  const auto found = options_.find(option);
+  if (found == options_.end()) return otherwise;
+  const std::string& text = found->second;
+  size_t number = 0;
+  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
+  if (error != std::errc() || end != text.data() + text.size()) {
+    throw UsageError("option " + option + " needs a number, not '" + text + "'");
+  }
+  return number;
 }
 
 std::string NameOf(const Command& command) {
@@ -24,6 +59,15 @@ std::string NameOf(const Command& command) {
 
 const std::vector<Command>& Commands() {
   static const std::vector<Command> commands = {
+      {"folder",
+       "list",
+       "[--group GROUP] [--keyword TEXT] [--sort KEY] [--desc] [--offset N] [--limit N] [--json]",
+       "list the indexed folders; KEY is path, name, document, audio, video or photo",
+       {"--group=", "--keyword=", "--sort=", "--desc", "--offset=", "--limit=", "--json"},
+       0,
+       FolderList},
+      {"folder", "get", "[--json] PATH", "say all about one indexed folder", {"--json"}, 1, FolderGet},
+      {"folder", "groups", "[--json]", "list the groups of the indexed folders", {"--json"}, 0, FolderGroups},
       {"queue",
        "fold",
        "[--summary] [--json] FILE",
@@ -31,6 +75,10 @@ const std::vector<Command>& Commands() {
        {"--summary", "--json"},
        1,
        QueueFold},
+      {"queue", "list", "[--json]", "list the queue of each share: its size and age", {"--json"}, 0, QueueList},
+      {"queue", "show", "[--json] SHARE", "print each operation that waits for a share", {"--json"}, 1, QueueShow},
+      {"pause", "", "[--json] [HOURS]", "pause indexing for HOURS or without end", {"--json"}, 0, Pause, 1},
+      {"resume", "", "[--json]", "end a pause", {"--json"}, 0, Resume},
       {"share", "list", "[--json]", "list the shares and whether they can be indexed", {"--json"}, 0, ShareList},
       {"share", "show", "[--json] NAME", "say all about one share", {"--json"}, 1, ShareShow},
       {"explain",

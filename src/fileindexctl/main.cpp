@@ -64,7 +64,8 @@ int Fail(int code, const std::string& reason, bool json) {
 int Run(const Command& command, const std::vector<std::string>& words) {
   try {
     const Arguments arguments(words, command.options);
-    if (arguments.operands().size() != command.operands) {
+    const size_t operands = arguments.operands().size();
+    if (operands < command.operands || operands > command.operands + command.optional_operands) {
       return Usage("usage: fileindexctl " + NameOf(command) + ' ' + command.synopsis);
     }
     try {

@@ -1,11 +1,21 @@
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <ctime>
 #include <iostream>
 #include <memory>
 #include <sstream>
 #include <string>
+#include <vector>
 
 #include "command.h"
+#include "common/error.h"
 #include "common/json.h"
+#include "common/sdk/share.h"
 #include "fileindex/optree.h"
+#include "fileindex/queue_mgr.h"
 #include "output.h"
 
 namespace quarrox::ctl {
@@ -13,6 +23,8 @@ namespace {
 
 using fileindex::OP;
 using fileindex::OPTree;
+using fileindex::QueueMgr;
+using sdk::SDKShare;
 
 std::string AsText(const OP& op) {
   std::ostringstream stream;
@@ -50,7 +62,87 @@ void PrintJson(std::ostream& out, const Summary& summary) {
   out << toString(object) << '\n';
 }
 
+// One file of a share's queue. When its newest event was written is what the file system knows; the oldest is older.
+struct QueueFile {
+  std::string share = {};
+  std::string path = {};
+  bool exists = false;
+  uint64_t bytes = 0;
+  int64_t idle_seconds = 0;  // since it was written to
+};
+
+QueueFile LookAt(const std::string& share, const std::string& path) {
+  QueueFile file{.share = share, .path = path};
+  struct stat info;
+  if (stat(path.c_str(), &info) == 0) {
+    file.exists = true;
+    file.bytes = static_cast<uint64_t>(info.st_size);
+    file.idle_seconds = std::max<int64_t>(0, time(nullptr) - info.st_mtime);
+  } else if (errno != ENOENT && errno != ENOTDIR) {
+    throw Error(kErrSystem, "Cannot look at " + path + ": " + strerror(errno));
+  }
+  return file;
+}
+
+// The ".tmp", which is drained first, stands before the queue, and only where there is one. A share that goes while the
+// list is walked is left out.
+std::vector<QueueFile> AllQueueFiles() {
+  std::vector<QueueFile> files;
+  for (const std::string& name : SDKShare::Enum()) {
+    try {
+      const QueueMgr queue(SDKShare(name).GetQueuePath());
+      files.push_back(LookAt(name, queue.queue_path_tmp()));
+      if (!files.back().exists) files.pop_back();
+      files.push_back(LookAt(name, queue.queue_path()));
+    } catch (const Error& error) {
+      if (error.code != kErrNoSuchShare) throw;
+    }
+  }
+  return files;
+}
+
+std::string AsJson(const QueueFile& file) {
+  Json::Value object;
+  object["share"] = file.share;
+  object["path"] = file.path;
+  object["exists"] = file.exists;
+  object["bytes"] = Json::UInt64(file.bytes);
+  object["idle_seconds"] = file.exists ? Json::Value(Json::Int64(file.idle_seconds)) : Json::Value();
+  return toString(object);
+}
+
+// In the largest unit that fits: "3 days", "12 s".
+std::string Duration(int64_t seconds) {
+  if (seconds >= 2 * 86400) return std::to_string(seconds / 86400) + " days";
+  if (seconds >= 2 * 3600) return std::to_string(seconds / 3600) + " hours";
+  if (seconds >= 2 * 60) return std::to_string(seconds / 60) + " min";
+  return std::to_string(seconds) + " s";
+}
+
 }  // namespace
+
+int QueueList(const Arguments& arguments) {
+  std::vector<std::vector<std::string>> rows = {{"SHARE", "BYTES", "LAST WRITTEN", "QUEUE"}};
+  for (const QueueFile& file : AllQueueFiles()) {
+    if (arguments.Has("--json")) {
+      std::cout << AsJson(file) << '\n';
+    } else {
+      rows.push_back({Visible(file.share), std::to_string(file.bytes),
+                      file.exists ? Duration(file.idle_seconds) + " ago" : "never", Visible(file.path)});
+    }
+  }
+  if (rows.size() > 1) PrintTable(std::cout, rows);
+  return kDone;
+}
+
+int QueueShow(const Arguments& arguments) {
+  const QueueMgr queue(SDKShare(arguments.operands().front()).GetQueuePath());
+  const bool json = arguments.Has("--json");
+  const auto print = [&](const std::shared_ptr<OP>& op) { std::cout << (json ? AsJson(*op) : AsText(*op)) << '\n'; };
+  queue.ProcessOP(print, true);
+  queue.ProcessOP(print, false);
+  return kDone;
+}
 
 // The operations go to standard output, the summary to standard error; with --summary there is only the summary, which
 // with

@@ -14,6 +14,7 @@ struct Calls {
   int next_rand = 0;
   int flock_failures = 0;
   int flock_error = 0;
+  time_t now = 0;  // 0 for the real time
   std::vector<useconds_t> sleeps = {};
   std::vector<int> flocks = {};
 };
@@ -27,6 +28,11 @@ Calls calls;
 void ResetCalls(int failures, int error) {
   const std::lock_guard<std::mutex> guard(lock);
   calls = {.next_rand = 8, .flock_failures = failures, .flock_error = error};
+}
+
+void SetTime(time_t now) {
+  const std::lock_guard<std::mutex> guard(lock);
+  calls.now = now;
 }
 
 std::vector<useconds_t> Sleeps() {
@@ -49,6 +55,20 @@ int usleep(useconds_t microseconds) {
   const std::lock_guard<std::mutex> guard(lock);
   calls.sleeps.push_back(microseconds);
   return 0;
+}
+
+unsigned int sleep(unsigned int seconds) {
+  usleep(seconds * 1000000);
+  return 0;
+}
+
+time_t time(time_t* result) noexcept {
+  const std::lock_guard<std::mutex> guard(lock);
+  timespec real = {};
+  if (calls.now == 0) clock_gettime(CLOCK_REALTIME, &real);
+  const time_t now = calls.now != 0 ? calls.now : real.tv_sec;
+  if (result != nullptr) *result = now;
+  return now;
 }
 
 int rand() noexcept {

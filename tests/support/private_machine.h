@@ -4,6 +4,7 @@
 
 #include <sched.h>
 #include <sys/mount.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <filesystem>
@@ -16,10 +17,22 @@ class PrivateMachine {
  public:
   // Takes the calling thread, and the threads and processes that it starts from then on, into a mount namespace of
   // their own, as an ordinary user into one where it is root. Copies of what was there are written to; they and the
-  // scratch directory are in memory and end with the last process. False where that is not possible, or not wholly.
+  // scratch directory are in memory and end with the last process. A process enters once, however often it asks. False
+  // where that is not possible, or not wholly.
   bool Enter() {
-    const std::string ids[] = {std::to_string(geteuid()), std::to_string(getegid())};
-    const bool root = geteuid() == 0;
+    static const bool entered = TryEnter();
+    return entered;
+  }
+
+  std::string scratch() const { return std::string(kMemory) + "/scratch"; }
+
+ private:
+  static constexpr char kMemory[] = "/mnt";  // there on every machine
+
+  bool TryEnter() {
+    const long uid = syscall(SYS_geteuid);  // geteuid() is replaced where the platform is
+    const std::string ids[] = {std::to_string(uid), std::to_string(syscall(SYS_getegid))};
+    const bool root = uid == 0;
     if (unshare(root ? CLONE_NEWNS : CLONE_NEWNS | CLONE_NEWUSER) != 0) return false;
     if (!root) {
       std::ofstream("/proc/self/setgroups") << "deny";
@@ -30,11 +43,6 @@ class PrivateMachine {
            mount("scratch", kMemory, "tmpfs", 0, "mode=0755") == 0 && std::filesystem::create_directory(scratch()) &&
            Overlay("/etc", "etc") && Overlay("/var", "var") && Empty("/run") && Empty("/tmp");
   }
-
-  std::string scratch() const { return std::string(kMemory) + "/scratch"; }
-
- private:
-  static constexpr char kMemory[] = "/mnt";  // there on every machine
 
   static bool Empty(const char* dir) { return mount("scratch", dir, "tmpfs", 0, "mode=1777") == 0; }
 

@@ -3,6 +3,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <climits>
 #include <cstdlib>
 #include <memory>
@@ -18,6 +19,7 @@ namespace quarrox {
 namespace {
 
 constexpr char kServiceUser[] = "Quarrox";
+constexpr mode_t kDirectoryMode = 0755;
 constexpr size_t kMaxLinkText = 4095;
 constexpr int kMaxLinks = 40;  // what the kernel follows, too
 
@@ -66,6 +68,15 @@ bool CheckACLPerm(const std::string& path, unsigned int permission) {
 std::string RealPath(const std::string& path) {
   const std::unique_ptr<char, decltype(&free)> resolved(realpath(path.c_str(), nullptr), &free);
   return resolved ? resolved.get() : std::string();
+}
+
+void MakeDirectoriesOf(const std::string& path) {
+  const int error = errno;
+  for (size_t end = path.find('/', 1); end != std::string::npos; end = path.find('/', end + 1)) {
+    const std::string directory = path.substr(0, end);
+    if (mkdir(directory.c_str(), kDirectoryMode) == 0) chmod(directory.c_str(), kDirectoryMode);
+  }
+  errno = error;
 }
 
 bool Unlink(const std::string& path) {

@@ -29,6 +29,10 @@ QUARROX_API bool CheckACLPerm(const std::string& path, unsigned int permission);
 // The canonical path; empty where there is none.
 QUARROX_API std::string RealPath(const std::string& path);
 
+// Makes the missing directories above a file, with mode 0755 whatever the umask is. One that cannot be made is noticed
+// by who writes the file. Leaves errno as it was.
+QUARROX_API void MakeDirectoriesOf(const std::string& path);
+
 // Removes a file. False and errno on failure.
 QUARROX_API bool Unlink(const std::string& path);
 

@@ -5,32 +5,39 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
+#include <utility>
 
 #include "common/error.h"
-#include "common/unique_fd.h"
 
 namespace quarrox {
 namespace {
+
+constexpr size_t kReadSize = size_t{64} * 1024;
 
 [[noreturn]] void Fail(const std::string& path) {
   const int error = errno;
   throw Error(kErrSystem, "Failed to append to queue, path=" + path + ", reason=" + strerror(error));
 }
 
-// An open queue file with its lock held; both go when it leaves scope.
+bool Lock(int fd, int operation) {
+  int result;
+  do result = flock(fd, operation);
+  while (result != 0 && errno == EINTR);
+  return result == 0;
+}
+
+// An open queue file with its lock held; both go when it leaves scope. False and errno where that failed.
 class LockedQueue {
  public:
-  explicit LockedQueue(const std::string& path)
-      : fd_(open(path.c_str(), O_RDWR | O_APPEND | O_CREAT | O_CLOEXEC, 0600)) {
-    if (!fd_) Fail(path);
-    int result;
-    do result = flock(fd(), LOCK_EX);
-    while (result != 0 && errno == EINTR);
-    if (result != 0) Fail(path);
+  LockedQueue(const std::string& path, int flags) : fd_(open(path.c_str(), flags | O_CLOEXEC, 0600)) {
+    if (fd_ && !Lock(fd(), LOCK_EX)) fd_ = UniqueFd();
   }
 
+  explicit operator bool() const { return static_cast<bool>(fd_); }
   int fd() const { return fd_.get(); }
   bool IsStillAt(const std::string& path) const {
     struct stat mine;
@@ -65,15 +72,95 @@ void Append(int fd, const std::string& path, const std::string& lines) {
   Fail(path);
 }
 
+// Another consumer may have taken a queue to the same place meanwhile, but not while this one holds the lock.
+bool RenameUnlessTaken(const std::string& path, const std::string& to) {
+  struct stat info;
+  if (lstat(to.c_str(), &info) == 0) {
+    errno = EEXIST;
+    return false;
+  }
+  return rename(path.c_str(), to.c_str()) == 0;
+}
+
 }  // namespace
 
 void AppendToQueue(const std::string& path, const std::string& lines) {
   for (;;) {
-    const LockedQueue queue(path);
+    const LockedQueue queue(path, O_RDWR | O_APPEND | O_CREAT);
+    if (!queue) Fail(path);
     if (!queue.IsStillAt(path)) continue;
     Append(queue.fd(), path, lines);
     return;
   }
+}
+
+bool TakeQueue(const std::string& path, const std::string& to) {
+  for (;;) {
+    const LockedQueue queue(path, O_RDWR);
+    if (!queue) return false;
+    if (queue.IsStillAt(path)) return RenameUnlessTaken(path, to);
+  }
+}
+
+bool WaitForProducers(const std::string& taken_path) {
+  const UniqueFd fd(open(taken_path.c_str(), O_RDONLY | O_CLOEXEC));
+  return fd && Lock(fd.get(), LOCK_SH);
+}
+
+// --- reading -------------------------------------------------------------------------------------------------------
+
+QueueLines::QueueLines(const std::string& path) {
+  const int error = errno;
+  fd_ = UniqueFd(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+  if (!fd_) error_ = std::exchange(errno, error);
+}
+
+bool QueueLines::Next(std::string_view& line) {
+  do {
+    if (NextInBuffer(line)) return true;
+  } while (Fill());
+  return false;
+}
+
+bool QueueLines::NextInBuffer(std::string_view& line) {
+  if (begin_ == end_) return false;
+  const char* begin = buffer_.data() + begin_;
+  const auto* newline = static_cast<const char*>(memchr(begin + searched_, '\n', end_ - begin_ - searched_));
+  searched_ = 0;
+  if (newline == nullptr && !at_end_) {
+    searched_ = end_ - begin_;
+    return false;
+  }
+  line = {begin, newline != nullptr ? static_cast<size_t>(newline - begin) : end_ - begin_};
+  begin_ += line.size() + (newline != nullptr ? 1 : 0);
+  overlong_ = std::exchange(cut_, false);
+  return true;
+}
+
+// Reads more. False at the end or on an error.
+bool QueueLines::Fill() {
+  if (at_end_ || error_ != 0) return false;
+  if (searched_ > kMaxLine) {  // only the beginning is kept while the rest goes by
+    cut_ = true;
+    searched_ = kMaxLine;
+    end_ = begin_ + kMaxLine;
+  }
+  if (begin_ > 0) {
+    memmove(buffer_.data(), buffer_.data() + begin_, end_ - begin_);
+    end_ -= begin_;
+    begin_ = 0;
+  }
+  if (buffer_.size() < end_ + kReadSize) buffer_.resize(std::max(buffer_.size() * 2, end_ + kReadSize));
+  ssize_t n;
+  do n = read(fd_.get(), buffer_.data() + end_, buffer_.size() - end_);
+  while (n < 0 && errno == EINTR);
+  if (n < 0) {
+    error_ = errno;
+    return false;
+  }
+  at_end_ = n == 0;
+  end_ += static_cast<size_t>(n);
+  return true;
 }
 
 }  // namespace quarrox

@@ -1,0 +1,105 @@
+#include <algorithm>
+#include <cstdint>
+#include <iostream>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "command.h"
+#include "common/json.h"
+#include "fileindex/folder_mgr.h"
+#include "output.h"
+
+namespace quarrox::ctl {
+namespace {
+
+using fileindex::Folder;
+using fileindex::FolderMgr;
+
+const std::vector<std::string>& SortKeys() {
+  static const std::vector<std::string> keys = {"path", "name", "document", "audio", "video", "photo"};
+  return keys;
+}
+
+// The kinds of files that a folder indexes; "none" where there are none.
+std::string TypesOf(const Folder& folder) {
+  std::string types;
+  for (const auto& [has, type] : {std::pair(folder.HasDocument(), "document"), std::pair(folder.HasAudio(), "audio"),
+                                  std::pair(folder.HasVideo(), "video"), std::pair(folder.HasPhoto(), "photo")}) {
+    if (has) types.append(types.empty() ? "" : ",").append(type);
+  }
+  return types.empty() ? "none" : types;
+}
+
+const char* YesNo(bool value) {
+  return value ? "yes" : "no";
+}
+
+void PrintRow(const char* name, const std::string& value) {
+  std::cout << name << Visible(value) << '\n';
+}
+
+void PrintFolder(const Folder& folder) {
+  PrintRow("path        ", folder.GetPath());
+  PrintRow("name        ", folder.GetName());
+  PrintRow("types       ", TypesOf(folder));
+  PrintRow("group       ", folder.GetGroup());
+  PrintRow("owner       ", folder.GetOwner());
+  PrintRow("privileged  ", YesNo(folder.IsPrivileged()));
+  PrintRow("paused      ", YesNo(folder.IsPaused()));
+}
+
+}  // namespace
+
+int FolderList(const Arguments& arguments) {
+  const std::string sort_by = arguments.Value("--sort", "path");
+  if (std::find(SortKeys().begin(), SortKeys().end(), sort_by) == SortKeys().end()) {
+    throw UsageError("option --sort knows no key '" + sort_by + "'");
+  }
+  const size_t offset = arguments.Number("--offset", 0);
+  const size_t limit = arguments.Number("--limit", SIZE_MAX);
+  std::vector<std::shared_ptr<Folder>> folders;
+  size_t total = 0;
+  FolderMgr().List(folders, total, offset, limit, sort_by, arguments.Has("--desc") ? "desc" : "asc",
+                   arguments.Value("--group", fileindex::kAll), arguments.Value("--keyword", ""));
+  if (arguments.Has("--json")) {
+    for (const auto& folder : folders) std::cout << toString(folder->GetData()) << '\n';
+    return kDone;
+  }
+  std::vector<std::vector<std::string>> rows = {{"PATH", "NAME", "TYPES", "GROUP", "PAUSED"}};
+  for (const auto& folder : folders) {
+    rows.push_back({Visible(folder->GetPath()), Visible(folder->GetName()), TypesOf(*folder),
+                    Visible(folder->GetGroup()), YesNo(folder->IsPaused())});
+  }
+  if (rows.size() > 1) PrintTable(std::cout, rows);
+  std::cout.flush();
+  if (folders.size() < total) std::cerr << "fileindexctl: " << folders.size() << " of " << total << " folders\n";
+  if (total == 0) std::cerr << "fileindexctl: there are no such folders\n";
+  return kDone;
+}
+
+int FolderGet(const Arguments& arguments) {
+  std::shared_ptr<Folder> folder;
+  FolderMgr().Get(folder, arguments.operands().front());
+  if (arguments.Has("--json")) {
+    std::cout << toString(folder->GetData()) << '\n';
+  } else {
+    PrintFolder(*folder);
+  }
+  return kDone;
+}
+
+int FolderGroups(const Arguments& arguments) {
+  for (const std::string& group : FolderMgr().GetGroups()) {
+    if (arguments.Has("--json")) {
+      Json::Value object;
+      object["group"] = group;
+      std::cout << toString(object) << '\n';
+    } else {
+      std::cout << Visible(group) << '\n';
+    }
+  }
+  return kDone;
+}
+
+}  // namespace quarrox::ctl
