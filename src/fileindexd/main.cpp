@@ -1,0 +1,53 @@
+#include <signal.h>
+#include <syslog.h>
+
+#include <cstdio>
+#include <exception>
+
+#include "common/log.h"
+#include "daemon.h"
+#include "fileindex/communication.h"
+#include "operation_handler.h"
+#include "options.h"
+#include "worker.h"
+
+namespace {
+
+using namespace quarrox::fileindexd;
+
+int Run(const Options& options) {
+  if (!options.worker) {
+    Daemon(quarrox::fileindex::kDaemonSocketPath, options.foreground).Run();
+    return 0;
+  }
+  const auto handler = MakeLoggingHandler(options.share);
+  return Worker(options.share, *handler).Run();
+}
+
+int Serve(const Options& options) {
+  // Whoever goes away while we write to them ends that, not us.
+  signal(SIGPIPE, SIG_IGN);
+  openlog("fileindexd", LOG_PID | (options.foreground ? LOG_PERROR : 0), LOG_DAEMON);
+  try {
+    return Run(options);
+  } catch (const std::exception& error) {
+    errno = 0;
+    QUARROX_LOG_FAILURE("%s", error.what());
+    if (!options.foreground) fprintf(stderr, "fileindexd: %s\n", error.what());
+    return 1;
+  }
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  try {
+    const Options options = ParseOptions(argc, argv);
+    if (!options.help) return Serve(options);
+    fputs(kUsage, stdout);
+    return 0;
+  } catch (const UsageError& error) {
+    fprintf(stderr, "fileindexd: %s\n\n%s", error.what(), kUsage);
+    return 2;
+  }
+}

@@ -1,0 +1,55 @@
+#include "options.h"
+
+#include <getopt.h>
+
+namespace quarrox::fileindexd {
+namespace {
+
+enum Option { kForeground = 1, kWorker, kHelp };
+
+constexpr option kOptions[] = {
+    {"foreground", no_argument, nullptr, kForeground},
+    {"worker", required_argument, nullptr, kWorker},
+    {"help", no_argument, nullptr, kHelp},
+    {nullptr, 0, nullptr, 0},
+};
+
+void Apply(Options& options, int option) {
+  switch (option) {
+    case kForeground:
+      options.foreground = true;
+      break;
+    case kWorker:
+      options.worker = true;
+      options.share = optarg;
+      break;
+    case kHelp:
+      options.help = true;
+      break;
+    default:
+      throw UsageError("An option is unknown or lacks its value");
+  }
+}
+
+}  // namespace
+
+const char* const kUsage =
+    "Usage: fileindexd [--foreground]\n"
+    "\n"
+    "Drains the event queues of all indexed shares, one process a share, until SIGTERM. It never leaves the "
+    "foreground.\n"
+    "\n"
+    "  --foreground     write the log to standard error, too\n"
+    "  --worker SHARE   serve this one share; so the daemon starts its workers\n"
+    "  --help           show this text\n";
+
+Options ParseOptions(int argc, char** argv) {
+  Options options;
+  opterr = 0;
+  optind = 1;
+  for (int option; (option = getopt_long(argc, argv, "", kOptions, nullptr)) != -1;) Apply(options, option);
+  if (optind < argc && !options.help) throw UsageError(std::string("'") + argv[optind] + "' is not expected");
+  return options;
+}
+
+}  // namespace quarrox::fileindexd

@@ -1,0 +1,180 @@
+#include "worker.h"
+
+#include <poll.h>
+#include <signal.h>
+#include <sys/timerfd.h>
+
+#include <cerrno>
+#include <iterator>
+#include <utility>
+
+#include "common/error.h"
+#include "common/file.h"
+#include "common/log.h"
+#include "common/sdk/share.h"
+#include "fileindex/queue_mgr.h"
+#include "fileindex/status_mgr.h"
+
+namespace quarrox::fileindexd {
+namespace {
+
+using fileindex::QueueMgr;
+using fileindex::StatusMgr;
+
+// How long the first line of a burst waits for the others.
+constexpr std::chrono::milliseconds kBurst(200);
+
+// Unwinds a pass. They are no Error: nobody on the way is to handle them.
+struct Paused {};
+struct Interrupted {};
+struct NoShare {};
+
+// Not time(), which may still say the second before where a timer says that it is over.
+int64_t Now() {
+  return std::chrono::system_clock::to_time_t(std::chrono::system_clock::now());
+}
+
+}  // namespace
+
+Worker::Worker(std::string share, OperationHandler& handler)
+    : share_(std::move(share)), handler_(handler), signals_({SIGTERM, SIGINT, SIGUSR1}) {}
+
+// True where there was one.
+bool Worker::TakeSignals() {
+  bool any = false;
+  for (int signal; (signal = signals_.Take()) != 0; any = true) stopping_ = stopping_ || signal != SIGUSR1;
+  return any;
+}
+
+// Throws Paused, or Error where that cannot be told.
+void Worker::LookAtPause() {
+  resume_time_ = StatusMgr().GetPauseInfo();
+  if (resume_time_ == fileindex::kPausedWithoutEnd || resume_time_ > Now()) throw Paused();
+}
+
+// A share may have moved to another place since the last look, or be gone.
+void Worker::OpenQueue() {
+  try {
+    const std::string path = sdk::SDKShare(share_).GetQueuePath();
+    if (!watch_ || watch_->path() != path) watch_.emplace(path);
+  } catch (const Error& error) {
+    if (error.code == kErrNoSuchShare) throw NoShare();
+    throw;
+  }
+}
+
+// A queue that cannot be watched is still drained, now and then.
+void Worker::Arm() {
+  armed_ = false;
+  try {
+    watch_->Arm();
+    armed_ = true;
+  } catch (const Error& error) {
+    errno = 0;
+    QUARROX_LOG_FAILURE("The queue of share %s is not watched, reason: %s", share_.c_str(), error.reason.c_str());
+  }
+}
+
+// False where nothing is pending.
+bool Worker::Pass() {
+  const std::string path = watch_->path();
+  QueueMgr queue(path);
+  // A pass that did not end leaves its ".tmp", and perhaps no queue beside it.
+  if (!queue.PrepareTmpQueue() && !IsFileExist(path + ".tmp")) return false;
+  queue.ProcessOP(
+      [this](const std::shared_ptr<fileindex::OP>& operation) {
+        if (TakeSignals()) {
+          if (stopping_) throw Interrupted();
+          LookAtPause();
+        }
+        handler_.Handle(*operation);
+      },
+      true);
+  handler_.Commit();
+  if (queue.DeleteTmp() != 0 && errno != ENOENT) FailCall("unlink " + path + ".tmp");
+  return true;
+}
+
+Worker::Outcome Worker::TryDrain() {
+  for (;;) {
+    TakeSignals();
+    if (stopping_) return Outcome::kInterrupted;
+    LookAtPause();
+    OpenQueue();
+    Arm();
+    if (!Pass()) return armed_ ? Outcome::kDrained : Outcome::kFailed;
+    backoff_.Reset();
+  }
+}
+
+Worker::Outcome Worker::Drain() {
+  try {
+    return TryDrain();
+  } catch (const Paused&) {
+    return Outcome::kPaused;
+  } catch (const Interrupted&) {
+    return Outcome::kInterrupted;
+  } catch (const NoShare&) {
+    return Outcome::kNoShare;
+  } catch (const Error& error) {
+    errno = 0;
+    QUARROX_LOG_FAILURE("A pass over the queue of share %s failed, code=%d, reason=%.8192s", share_.c_str(), error.code,
+                        error.reason.c_str());
+  } catch (const std::exception& error) {
+    errno = 0;
+    QUARROX_LOG_FAILURE("A pass over the queue of share %s failed, reason=%.8192s", share_.c_str(), error.what());
+  }
+  return Outcome::kFailed;
+}
+
+void Worker::WaitForQueue() {
+  pollfd fds[1 + QueueWatch::kPollFds];
+  do {
+    fds[0] = {signals_.fd(), POLLIN, 0};
+    watch_->FillPollFds(fds + 1);
+    PollUntil(fds, std::size(fds), kNever);
+    if (fds[0].revents != 0) return;
+  } while (!watch_->Reported(fds + 1));
+  PollUntil(fds, 1, Clock::now() + kBurst);
+}
+
+// Waits for the resume time by the clock that people set, also where that is set meanwhile.
+void Worker::WaitForResume() {
+  watch_.reset();
+  const UniqueFd timer(timerfd_create(CLOCK_REALTIME, TFD_CLOEXEC | TFD_NONBLOCK));
+  if (!timer) FailCall("timerfd_create");
+  itimerspec when = {};
+  when.it_value.tv_sec = resume_time_;  // 0 sets no timer: a pause without end
+  if (timerfd_settime(timer.get(), TFD_TIMER_ABSTIME, &when, nullptr) != 0) FailCall("timerfd_settime");
+  pollfd fds[] = {{signals_.fd(), POLLIN, 0}, {timer.get(), POLLIN, 0}};
+  PollUntil(fds, std::size(fds), kNever);
+}
+
+void Worker::WaitToTryAgain() {
+  pollfd fds[] = {{signals_.fd(), POLLIN, 0}};
+  PollUntil(fds, std::size(fds), Clock::now() + backoff_.Next());
+}
+
+int Worker::Run() {
+  while (!stopping_) {
+    switch (Drain()) {
+      case Outcome::kDrained:
+        backoff_.Reset();
+        WaitForQueue();
+        break;
+      case Outcome::kPaused:
+        WaitForResume();
+        break;
+      case Outcome::kFailed:
+        WaitToTryAgain();
+        break;
+      case Outcome::kNoShare:
+        return kExitNoShare;
+      case Outcome::kInterrupted:
+        break;
+    }
+  }
+  return 0;
+}
+
+}  // namespace quarrox::fileindexd

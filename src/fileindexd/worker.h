@@ -1,0 +1,54 @@
+// The process that drains the queue of one share.
+//
+// It runs passes until the queue is empty: the queue is taken aside, its operations are handed out, and what was taken
+// aside is deleted once they are committed. Then it waits in the kernel for the queue to be written. While indexing is
+// paused it hands nothing out; a pass is left where it is, and is run again from its beginning afterwards.
+//
+// The daemon sends it SIGUSR1 when settings or the state of pausing have changed, and SIGTERM to end it.
+#pragma once
+
+#include <optional>
+#include <string>
+
+#include "backoff.h"
+#include "operation_handler.h"
+#include "queue_watch.h"
+#include "wait.h"
+
+namespace quarrox::fileindexd {
+
+// How a worker's process ends where its share does not exist.
+inline constexpr int kExitNoShare = 3;
+
+class Worker {
+ public:
+  Worker(std::string share, OperationHandler& handler);
+
+  // Works until SIGTERM or SIGINT; returns the process's exit status. Throws only what it can do nothing about.
+  int Run();
+
+ private:
+  enum class Outcome { kDrained, kPaused, kInterrupted, kFailed, kNoShare };
+
+  bool TakeSignals();
+  void LookAtPause();
+  void OpenQueue();
+  void Arm();
+  Outcome Drain();
+  Outcome TryDrain();
+  bool Pass();
+  void WaitForQueue();
+  void WaitForResume();
+  void WaitToTryAgain();
+
+  const std::string share_;
+  OperationHandler& handler_;
+  Signals signals_;
+  bool stopping_ = false;
+  bool armed_ = false;
+  int64_t resume_time_ = 0;  // while paused, as StatusMgr::GetPauseInfo
+  std::optional<QueueWatch> watch_;
+  Backoff backoff_;
+};
+
+}  // namespace quarrox::fileindexd
