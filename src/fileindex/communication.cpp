@@ -115,8 +115,7 @@ void DropFrame(int fd) {
 void SendCommandToDaemon(const std::string& command, const Json::Value& data) {
   const UniqueFd fd_socket(socket(PF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
   if (!fd_socket) {
-    QUARROX_THROW("0 > (fd_socket = socket(PF_UNIX, SOCK_STREAM, 0))", kErrSystem,
-                  SystemReason("socket", errno));
+    QUARROX_THROW("0 > (fd_socket = socket(PF_UNIX, SOCK_STREAM, 0))", kErrSystem, SystemReason("socket", errno));
   }
   Connect(fd_socket.get());
   if (0 > setsockopt(fd_socket.get(), SOL_SOCKET, SO_SNDTIMEO, &kSendTimeout, sizeof(kSendTimeout))) {
