@@ -6,10 +6,7 @@
 #include <cstring>
 #include <fstream>
 #include <functional>
-#include <memory>
 #include <string>
-
-#include <json/json.h>
 
 #include "fileindex/optree.h"
 #include "measure.h"
@@ -19,19 +16,10 @@ namespace {
 
 using quarrox::bench::Cost;
 using quarrox::bench::Measure;
+using quarrox::bench::ParseLines;
 using quarrox::bench::Queue;
 using quarrox::bench::QueueWriter;
 using quarrox::fileindex::OPTree;
-
-void ParseLines(const std::string& queue) {
-  std::ifstream stream(queue);
-  const std::unique_ptr<Json::CharReader> reader(Json::CharReaderBuilder().newCharReader());
-  std::string line;
-  while (std::getline(stream, line)) {
-    Json::Value value;
-    if (!reader->parse(line.data(), line.data() + line.size(), &value, nullptr)) abort();
-  }
-}
 
 void Fold(const std::string& queue) {
   OPTree tree(queue);

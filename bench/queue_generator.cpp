@@ -1,7 +1,11 @@
 #include "queue_generator.h"
 
 #include <algorithm>
+#include <cstdlib>
+#include <memory>
 #include <unordered_set>
+
+#include <json/json.h>
 
 namespace quarrox::bench {
 
@@ -124,6 +128,16 @@ class Day {
 
 size_t WriteRealisticQueue(const std::string& path, size_t lines, Queue kind) {
   return Day(path, lines, kind).Run();
+}
+
+void ParseLines(const std::string& queue) {
+  std::ifstream stream(queue);
+  const std::unique_ptr<Json::CharReader> reader(Json::CharReaderBuilder().newCharReader());
+  std::string line;
+  while (std::getline(stream, line)) {
+    Json::Value value;
+    if (!reader->parse(line.data(), line.data() + line.size(), &value, nullptr)) abort();
+  }
 }
 
 }  // namespace quarrox::bench

@@ -36,4 +36,7 @@ enum class Queue {
 // and a line in 1000 renames a directory. About one distinct path for five lines. Returns the number of distinct paths.
 size_t WriteRealisticQueue(const std::string& path, size_t lines, Queue kind = Queue::kUsual);
 
+// The yardstick: jsoncpp parses every line of a queue, and nothing else is done with it.
+void ParseLines(const std::string& queue);
+
 }  // namespace quarrox::bench
