@@ -22,12 +22,13 @@
 namespace quarrox::fileindex {
 namespace {
 
-// That a file is missing is no failure: it leaves no errno for the next line of the log.
+// Only what is known to be missing is: a file that cannot be looked at now must not be taken for a drained one. That a
+// file is missing is no failure: it leaves no errno for the next line of the log.
 bool Exists(const std::string& path) {
   const int error = errno;
-  const bool exists = IsFileExist(path);
+  const bool missing = !IsFileExist(path) && (errno == ENOENT || errno == ENOTDIR);
   errno = error;
-  return exists;
+  return !missing;
 }
 
 std::shared_ptr<OPTree> BuiltTree(const std::string& path) {
@@ -44,16 +45,18 @@ class FolderEvents {
 
   bool Accepts(const EventView& event) {
     if ((event.event & kEventQueueDamaged) != 0) return true;
-    if (Touches(event.event, event.path)) return true;
-    return (event.event & kEventRename) != 0 && Touches(event.event, event.path_old) && CanHaveNode(event.path);
+    if (Touches(event, event.path)) return true;
+    return (event.event & kEventRename) != 0 && Touches(event, event.path_old) && CanHaveNode(event.path);
   }
 
  private:
   static constexpr uint32_t kConcernsAllBelow = kEventReindex | kEventRename;
+  static constexpr uint32_t kConcernsAllBelowDirectory = kEventCreate | kEventDelete;  // they become reindexes
 
   // From a path that can have no node comes no operation.
-  bool Touches(uint32_t bits, std::string_view place) {
-    if ((bits & kConcernsAllBelow) != 0 && IsAtOrBelow(full_path_, place)) return CanHaveNode(place);
+  bool Touches(const EventView& event, std::string_view place) {
+    const uint32_t all_below = kConcernsAllBelow | (event.is_dir ? kConcernsAllBelowDirectory : 0);
+    if ((event.event & all_below) != 0 && IsAtOrBelow(full_path_, place)) return CanHaveNode(place);
     return is_folder_ && IsAtOrBelow(place, full_path_) && CanHaveNode(place) && IsGoverned(place);
   }
   bool IsGoverned(std::string_view place) {

@@ -52,7 +52,7 @@ class QUARROX_API QueueMgr {
 
   // Whether anything is pending for the indexed folder with the full path `path`:
   // - an event that this folder governs (FolderMgr::GetMostSuitableCfg of the event's path has the full path `path`);
-  // - a reindex or a rename of `path` or of a directory above it;
+  // - a reindex or a rename of `path` or of a directory above it, or its creation or deletion as a directory;
   // - a mark that events were lost: all of the share will be looked at.
   // A rename counts at its old path as at its new one, because the documents of both ends change. Loads the folder
   // list once, and only where there is a queue or a ".tmp"; throws what that throws.

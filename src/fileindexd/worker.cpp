@@ -65,13 +65,20 @@ void Worker::OpenQueue() {
 
 // A queue that cannot be watched is still drained, now and then.
 void Worker::Arm() {
+  const bool told = watch_told_;
   armed_ = false;
   try {
     watch_->Arm();
     armed_ = true;
+    watch_told_ = false;
   } catch (const Error& error) {
+    watch_told_ = true;
     errno = 0;
-    QUARROX_LOG_FAILURE("The queue of share %s is not watched, reason: %s", share_.c_str(), error.reason.c_str());
+    if (told) return;
+    QUARROX_LOG_FAILURE(
+        "The queue of share %s is looked at once a minute because it cannot be watched, reason: %s; raise "
+        "fs.inotify.max_user_instances and fs.inotify.max_user_watches",
+        share_.c_str(), error.reason.c_str());
   }
 }
 

@@ -46,6 +46,7 @@ class Worker {
   Signals signals_;
   bool stopping_ = false;
   bool armed_ = false;
+  bool watch_told_ = false;  // that it is not armed
   int64_t resume_time_ = 0;  // while paused, as StatusMgr::GetPauseInfo
   std::optional<QueueWatch> watch_;
   Backoff backoff_;

@@ -111,13 +111,21 @@ void WorkerPool::HandleEnd(const std::string& share, Worker& worker, int status)
     worker.start_at = Clock::now();
   } else if (!WIFEXITED(status) || WEXITSTATUS(status) != kExitNoShare) {
     StartLater(share, worker, "ended " + Describe(status));
-  } else if (!worker.missing_told) {
-    worker.missing_told = true;
-    errno = 0;
-    QUARROX_LOG_FAILURE(
-        "The share %s does not exist, so its folders are left out; remove them from the list of folders",
-        share.c_str());
+  } else {
+    WaitForShare(share, worker);
   }
+}
+
+// Its configuration may be out of reach for a moment, and a share that is gone may come back.
+void WorkerPool::WaitForShare(const std::string& share, Worker& worker) const {
+  worker.start_at = Clock::now() + worker.backoff.Next();
+  if (worker.missing_told) return;
+  worker.missing_told = true;
+  errno = 0;
+  QUARROX_LOG_FAILURE(
+      "The share %s is not to be found, so its folders are left out until it is; where it is gone for good, remove "
+      "them from the list of folders",
+      share.c_str());
 }
 
 void WorkerPool::Reap() {

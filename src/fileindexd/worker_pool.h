@@ -67,6 +67,7 @@ class WorkerPool {
 
   void Spawn(const std::string& share, Worker& worker) const;
   void HandleEnd(const std::string& share, Worker& worker, int status) const;
+  void WaitForShare(const std::string& share, Worker& worker) const;
   void StartLater(const std::string& share, Worker& worker, const std::string& why) const;
 
   const bool foreground_;

@@ -106,7 +106,12 @@ class FileindexdTest(unittest.TestCase):
         subprocess.run(["kill", "-KILL", *self.workers()], check=True)
         append(["after"])
         self.until(lambda: handled()[-len(MANY) - 1:] == MANY + ["after"])
-        self.assertEqual(LOG.read_text().count("The share gone does not exist"), 1)
+        self.assertEqual(LOG.read_text().count("The share gone is not to be found"), 1)
+        os.rename("/etc/vexo/shares.conf", "/etc/vexo/away")
+        append(["unseen"])
+        self.until(lambda: len(self.workers()) < 2)
+        os.rename("/etc/vexo/away", "/etc/vexo/shares.conf")
+        self.until(lambda: handled()[-1] == "unseen" and len(self.workers()) == 2)
 
     def test_a_pause_stops_a_pass_and_both_its_end_and_resume_run_it_again(self):
         for end, pause in (("resume", 0), ("time", 3)):

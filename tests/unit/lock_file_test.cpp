@@ -74,5 +74,14 @@ TEST_F(LockFileTest, RetriesAfterASignalButNoOtherFailure) {
                                    reason + " [err: No such file or directory]")));
 }
 
+TEST_F(LockFileTest, OthersCanOpenItWhateverTheUmaskIs) {
+  const mode_t mask = umask(077);
+  { const LockFile lock(path_, true); }
+  umask(mask);
+  struct stat info = {};
+  stat(path_.c_str(), &info);
+  EXPECT_EQ(info.st_mode & 0777, 0644U);
+}
+
 }  // namespace
 }  // namespace quarrox

@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <sys/file.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <filesystem>
@@ -50,6 +51,13 @@ TEST_F(QueueFileTest, IsMadePrivateAndGrowsByWholeLines) {
   AppendToQueue(path_, "two\n");
   AppendToQueue(path_, "three\nfour\n");
   EXPECT_EQ(ReadText(path_), "one\n{\"to\ntwo\nthree\nfour\n");
+  const std::string drained_by_another = dir_ / "another";
+  mkdir(drained_by_another.c_str(), 0700);
+  if (chown(drained_by_another.c_str(), 1, 1) != 0) return;  // only root can make it so
+  AppendToQueue(drained_by_another + "/queue", "one\n");
+  struct stat info = {};
+  stat((drained_by_another + "/queue").c_str(), &info);
+  EXPECT_EQ(info.st_uid, 1U);
 }
 
 TEST_F(QueueFileTest, AFailureIsError502AndLeavesNoTornLine) {

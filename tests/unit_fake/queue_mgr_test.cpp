@@ -62,6 +62,7 @@ TEST(QueueMgrTest, PendingEventsAreFoundByTheFolderThatTheyConcern) {
     mr{"event":256,"path":"/v/t","path_old":"/v/s//m/"} {"event":256,"path":"t","path_old":"/v/s/m"} {"event":4,"path":"/v/s"}
     MR{"event":65536,"path":"//v/s/m/"} {"event":65536,"path":"/v/s/o/p"} mrp{"event":65540,"path":"/v/s"}
     MRP{"event":64,"path":"/v/s","\u0065vent":65536} mrp{"event":512,"path":"/v/t"} {"event":65536,"path":"/v/s/m"}}
+    mrp{"event":64,"is_dir":true,"path":"/v/s"} mr{"event":128,"is_dir":true,"path":"/v/s/m"} {"event":128,"path":"/v/s"}
     mr{"event":4,"path":"/v/s/m/r/a"};{"event":4,"path":"/v/s/m/z"}
     {"event":65536,"path":"/v/s/o"} {"event":65536,"path":""} {"event":64,"path":"/v/s/m/)" +
       std::string(70000, 'x') + R"("}

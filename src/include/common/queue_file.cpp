@@ -12,6 +12,7 @@
 #include <utility>
 
 #include "common/error.h"
+#include "common/strings.h"
 
 namespace quarrox {
 namespace {
@@ -56,9 +57,19 @@ bool EndsInsideLine(int fd, off_t size) {
   return size > 0 && pread(fd, &last, 1, size - 1) == 1 && last != '\n';
 }
 
+// A queue that root makes belongs to whom its directory belongs to, who drains it.
+void GiveToOwnerOfDirectory(int fd, const std::string& path) {
+  struct stat directory;
+  if (geteuid() != 0 || stat((Dirname(path) + "/").c_str(), &directory) != 0 || directory.st_uid == 0) return;
+  if (fchown(fd, directory.st_uid, directory.st_gid) != 0) {
+    // On a file system without owners everybody may read it.
+  }
+}
+
 void Append(int fd, const std::string& path, const std::string& lines) {
   const off_t before = lseek(fd, 0, SEEK_END);
   if (before < 0) Fail(path);
+  if (before == 0) GiveToOwnerOfDirectory(fd, path);
   const std::string text = EndsInsideLine(fd, before) ? "\n" + lines : lines;
   ssize_t written;
   do written = write(fd, text.data(), text.size());

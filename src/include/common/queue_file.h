@@ -18,9 +18,9 @@
 namespace quarrox {
 
 // Appends `lines`, whole newline-terminated lines, to the queue at `path`, which is made with mode 0600 where it is
-// absent. Waits in the kernel for the lock. All of `lines` is appended or nothing: a write cut short (a full disk) is
-// undone. Throws Error 502 with the reason "Failed to append to queue, path=PATH, reason=TEXT",
-// which is not logged: whoever tries again says so once.
+// absent; what root makes belongs to the owner of the directory. Waits in the kernel for the lock. All of `lines` is
+// appended or nothing: a write cut short (a full disk) is undone. Throws Error 502 with the reason "Failed to append to
+// queue, path=PATH, reason=TEXT", which is not logged: whoever tries again says so once.
 QUARROX_API void AppendToQueue(const std::string& path, const std::string& lines);
 
 // Renames the queue at `path` to `to`, waiting in the kernel for the lock. False with errno where that fails, both then
