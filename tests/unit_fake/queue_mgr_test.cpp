@@ -50,6 +50,8 @@ TEST(QueueMgrTest, PendingEventsAreFoundByTheFolderThatTheyConcern) {
   if (!support::PrivateMachine().Enter()) GTEST_SKIP() << "no machine of one's own";
   const support::TempDir dir;
   const QueueMgr queue(dir / "queue");
+  std::filesystem::remove(kFileIndexFoldersCfgPath);
+  support::FakePlatform::Get().Reset();
   support::FakePlatform::Get().shares = {{.name = "s", .path = "/v/s"}};
   FolderMgr folders;
   for (std::shared_ptr<Folder> diff; const char* path : {"/s/m", "/s/m/r", "/s/op"})

@@ -25,9 +25,9 @@ enum ErrorCode : int32_t {
   kErrPathNotIndexable = 903,  // the path may not be indexed
   kErrMalformedEvent = 906,    // a raw event line is not valid JSON
   kErrEngineReceive = 913,     // receiving the search engine's reply failed
-  kErrEngineParse = 914,       // the search engine's reply for a document could not be parsed
+  kErrEngineParse = 914,       // the fields of a document could not be extracted from its file
   kErrEngineNoData = 916,      // the search engine's reply lacks its data
-  kErrEngineReply = 917,       // the search engine's reply is not of the expected form
+  kErrEngineReply = 917,       // the search engine has no document of this path, or its reply is not as expected
   kErrNoSpace = 1003,          // not enough free space for an index
   kErrInternal = 9999,         // internal inconsistency of the operation tree
 };

@@ -205,8 +205,8 @@ CALL(bool, MonitorQueue::Delete, (const std::string& queue, const std::string& a
 }  // namespace VEXO::VEXONOTIFYD
 
 namespace VEXO::CONTENT_EXTRACT {
-CALL(void, ParseFile, (const std::string& path, const Json::Value&, Json::Value& document),
-     throw std::runtime_error("cannot look at " + path), Merge(path, document), path)
+CALL(void, ParseFile, (const std::string& path, const Json::Value& options, Json::Value& document),
+     throw std::runtime_error("cannot look at " + path), Merge(path, document), path, options["need_meta"].asString())
 }  // namespace VEXO::CONTENT_EXTRACT
 
 namespace quarrox::support {

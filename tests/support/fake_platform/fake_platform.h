@@ -8,6 +8,7 @@
 #include <sys/types.h>
 
 #include <cerrno>
+#include <deque>
 #include <map>
 #include <string>
 #include <utility>
@@ -96,6 +97,12 @@ class FakePlatform {
   // The SMB service's search switch, and what VLIBShareConfigCheck finds wrong.
   bool spotlight = false;
   std::vector<std::string> share_problems = {};
+
+  // The texts that the search engine was sent, and those that it answers, in this order; without one it answers
+  // {"success":true}. A connection fails through Fail of "DomainSockConnection::Connect", "SockConnection::Send" or
+  // "...::Recv".
+  std::vector<std::string> engine_requests = {};
+  std::deque<std::string> engine_answers = {};
 
   // What the methods above have made; paths without a slash at the end.
   std::vector<FakeShare> shares = {};
