@@ -3,13 +3,16 @@
 #include <sys/stat.h>
 
 #include <cerrno>
+#include <cmath>
 #include <filesystem>
 #include <string>
 
 #include <gtest/gtest.h>
 
+#include "common/json_reader.h"
 #include "support/errors.h"
 #include "support/file_size_limit.h"
+#include "support/json_reference.h"
 #include "support/temp_dir.h"
 
 namespace quarrox {
@@ -28,6 +31,14 @@ Json::Value Parse(const std::string& text) {
   Json::Value value;
   EXPECT_TRUE(fromString(value, text)) << text;
   return value;
+}
+
+void ExpectReadLikeJsoncpp(const std::string& text) {
+  Json::Value ours;
+  Json::Value theirs;
+  const bool accepted = fromString(ours, text);
+  EXPECT_EQ(accepted, ReadJsonByRules(theirs, text)) << text;
+  EXPECT_TRUE(!accepted || (ours == theirs && toString(ours) == toString(theirs))) << text;
 }
 
 template <typename T>
@@ -58,6 +69,43 @@ TEST(JsonText, IsExactlyOneValueOfAnyTypeAndOfDoubledKeysTheLast) {
 TEST(JsonText, NestingTooDeepIsAFailureNotACrash) {
   EXPECT_NE(Through(std::string(900, '[') + std::string(900, ']')), "refused");
   EXPECT_EQ(Through(std::string(100000, '[')), "refused");
+}
+
+TEST(JsonText, MeansWhatJsoncppMakesOfIt) {
+  ExpectReadLikeJsoncpp("[0,-0,9223372036854775807,9223372036854775808,-9223372036854775808,18446744073709551615]");
+  ExpectReadLikeJsoncpp(
+      "[-9223372036854775809,18446744073709551616,-0.0,1.0,1E2,4.9e-324,1e-400,0.300000000000000041]");
+  ExpectReadLikeJsoncpp("[\"\x01\n 0123456789abcdef \x1f\",\"\\ud83d\\ude00\\u00e4\\/\"]");
+  ExpectReadLikeJsoncpp("{\"a\\u0000b\":1,\"a\":[2],\"a\":{}}");
+  for (const char* text : {"007", "[1.]", "-", "[.5]", "[+1]", "1e400", "\xef\xbb\xbf[1]", "{\"\":1,}", "\"\\ud800\"",
+                           "\"\\ud800\\u0041\"", "\"\\udc00\""}) {
+    ExpectReadLikeJsoncpp(text);
+  }
+  for (const size_t depth : {500U, 501U, 1000U, 1002U}) {
+    ExpectReadLikeJsoncpp(std::string(depth, '[') + std::string(depth, ']'));
+  }
+  Json::Value value;
+  EXPECT_TRUE(ReadPlainJson(value, R"({"a":[1,-2.5,"x\u00e4\n",true,null,{}]})")) << "the fast road is never taken";
+}
+
+TEST(JsonText, IsWrittenAsJsoncppWritesIt) {
+  Json::Value value(Json::arrayValue);
+  for (unsigned int i = 0; i < 17 * 256; ++i) {
+    std::string text(18, '\n');
+    text.replace(0, 17, 17, 'x');
+    text[i / 256] = static_cast<char>(i);
+    value[2 * i][text] = text;  // and an element beside it that was never assigned
+  }
+  for (const double number : {-0.0, 1.0, 0.1, 1e17, 1e300, -HUGE_VAL, std::nan("")}) value.append(number);
+  value.append(Json::Value::maxUInt64);
+  value.append(Json::Value::minInt64);
+  EXPECT_EQ(toString(value), support::WriteByJsonCpp(value));
+  for (int i = 0; i < 3000; ++i) {
+    Json::Value outer(Json::arrayValue);
+    outer.append(Json::Value()).swap(value);
+    value.swap(outer);
+  }
+  EXPECT_EQ(toString(value), support::WriteByJsonCpp(value));
 }
 
 TEST(JsonFile, ReplacesWholeOrNotAtAllAndLeavesNothingBeside) {

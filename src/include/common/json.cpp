@@ -6,30 +6,14 @@
 
 #include <cerrno>
 #include <cstdlib>
-#include <memory>
-#include <sstream>
 
+#include "common/json_reader.h"
 #include "common/log.h"
 #include "common/strings.h"
 #include "common/unique_fd.h"
 
 namespace quarrox {
 namespace {
-
-Json::CharReaderBuilder MakeReaderBuilder() {
-  Json::CharReaderBuilder builder;
-  Json::CharReaderBuilder::strictMode(&builder.settings_);
-  builder["strictRoot"] = false;
-  builder["rejectDupKeys"] = false;
-  return builder;
-}
-
-Json::StreamWriterBuilder MakeWriterBuilder() {
-  Json::StreamWriterBuilder builder;
-  builder["indentation"] = "";
-  builder["emitUTF8"] = true;
-  return builder;
-}
 
 bool ReadAll(int fd, std::string& text) {
   char buffer[65536];
@@ -68,19 +52,7 @@ bool WriteTemporary(int fd, const std::string& path, const std::string& text) {
 }  // namespace
 
 bool fromString(Json::Value& value, const std::string& text) {
-  if (text.find('\0') != std::string::npos) return false;  // jsoncpp takes it for the end of the text
-  static const Json::CharReaderBuilder builder = MakeReaderBuilder();
-  const std::unique_ptr<Json::CharReader> reader(builder.newCharReader());
-  try {
-    return reader->parse(text.data(), text.data() + text.size(), &value, nullptr);
-  } catch (const Json::Exception&) {
-    return false;  // nested past the limit
-  }
-}
-
-std::string toString(const Json::Value& value) {
-  static const Json::StreamWriterBuilder builder = MakeWriterBuilder();
-  return Json::writeString(builder, value);
+  return ReadPlainJson(value, text) || ReadJsonByRules(value, text);
 }
 
 bool fromFile(Json::Value& value, const std::string& path) {
