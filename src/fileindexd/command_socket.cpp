@@ -1,15 +1,10 @@
 #include "command_socket.h"
 
-#include <fcntl.h>
 #include <sys/epoll.h>
-#include <sys/file.h>
 #include <sys/socket.h>
-#include <sys/stat.h>
-#include <sys/un.h>
 
 #include <algorithm>
 #include <cerrno>
-#include <cstring>
 #include <iterator>
 #include <utility>
 
@@ -20,14 +15,6 @@ namespace {
 
 // How long no client is accepted where the process has no descriptor left.
 constexpr std::chrono::seconds kAcceptPause(1);
-
-UniqueFd LockAlone(const std::string& path) {
-  UniqueFd lock(open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
-  if (!lock) FailCall("open " + path);
-  if (flock(lock.get(), LOCK_EX | LOCK_NB) == 0) return lock;
-  if (errno != EWOULDBLOCK) FailCall("flock " + path);
-  throw Error(kErrSystem, "Another fileindexd is running: it holds the lock of " + path);
-}
 
 // The answer is far smaller than any socket's buffer, so one that cannot be written at once has nobody to read it.
 // Nothing follows it, but what the client still sends is to be read: closing now would fail its writing, and it might
@@ -46,33 +33,13 @@ void Refuse(int fd, const Error& error) {
 }  // namespace
 
 CommandSocket::CommandSocket(const std::string& path)
-    : path_(path), lock_(LockAlone(path + ".lock")), epoll_(epoll_create1(EPOLL_CLOEXEC)) {
+    : listener_(path, rights_.group(), "fileindexd"), epoll_(epoll_create1(EPOLL_CLOEXEC)) {
   if (!epoll_) FailCall("epoll_create1");
-  Listen();
+  SetAccepting(true);
 }
 
 CommandSocket::~CommandSocket() {
   Close();
-}
-
-// The socket listens before it takes its place, so that nobody who connects is turned away in between.
-void CommandSocket::Listen() {
-  const std::string fresh = path_ + ".new";
-  sockaddr_un address = {};
-  address.sun_family = AF_UNIX;
-  if (fresh.size() >= sizeof(address.sun_path)) throw Error(kErrSystem, "The socket's path is too long: " + path_);
-  memcpy(address.sun_path, fresh.c_str(), fresh.size());
-  unlink(fresh.c_str());
-  listener_ = UniqueFd(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
-  if (!listener_) FailCall("socket");
-  const auto* generic = reinterpret_cast<const sockaddr*>(&address);
-  if (bind(listener_.get(), generic, sizeof(address)) != 0) FailCall("bind " + fresh);
-  constexpr auto kSame = static_cast<uid_t>(-1);
-  if (chown(fresh.c_str(), kSame, rights_.group()) != 0) QUARROX_LOG_FAILURE("chown %s failed", fresh.c_str());
-  if (chmod(fresh.c_str(), 0660) != 0) FailCall("chmod " + fresh);
-  if (listen(listener_.get(), SOMAXCONN) != 0) FailCall("listen");
-  if (rename(fresh.c_str(), path_.c_str()) != 0) FailCall("rename " + fresh);
-  SetAccepting(true);
 }
 
 void CommandSocket::Watch(int fd, int operation, unsigned int events) {
@@ -84,7 +51,7 @@ void CommandSocket::Watch(int fd, int operation, unsigned int events) {
 
 void CommandSocket::SetAccepting(bool accepting) {
   if (accepting_ == accepting) return;
-  Watch(listener_.get(), accepting ? EPOLL_CTL_ADD : EPOLL_CTL_DEL, EPOLLIN);
+  Watch(listener_.fd(), accepting ? EPOLL_CTL_ADD : EPOLL_CTL_DEL, EPOLLIN);
   accepting_ = accepting;
   accept_again_ = kNever;
 }
@@ -100,7 +67,7 @@ void CommandSocket::Process(std::vector<Command>& commands) {
   const int count = epoll_wait(epoll_.get(), events, static_cast<int>(std::size(events)), 0);
   bool knock = false;
   for (int i = 0; i < count; ++i) {
-    if (events[i].data.fd == listener_.get()) {
+    if (events[i].data.fd == listener_.fd()) {
       knock = true;
     } else {
       Serve(events[i].data.fd, commands);
@@ -116,7 +83,7 @@ void CommandSocket::Process(std::vector<Command>& commands) {
 
 void CommandSocket::Accept() {
   while (clients_.size() < kMaxClients) {
-    UniqueFd fd(accept4(listener_.get(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
+    UniqueFd fd = listener_.Accept();
     if (fd) {
       Admit(std::move(fd));
       continue;
@@ -183,15 +150,15 @@ void CommandSocket::Expire() {
 }
 
 void CommandSocket::Close() {
-  if (!listener_) return;
-  unlink(path_.c_str());
+  if (listener_.fd() < 0) return;
+  listener_.Withdraw();
   const Error stopping(kErrSystem, "The daemon is stopping");
   for (const auto& [fd, client] : clients_) {
     if (!client.answered) Refuse(fd, stopping);
   }
   clients_.clear();
   for (;;) {
-    const UniqueFd waiting(accept4(listener_.get(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
+    const UniqueFd waiting = listener_.Accept();
     if (!waiting) break;
     Refuse(waiting.get(), stopping);
   }

@@ -10,8 +10,9 @@
 #include <vector>
 
 #include "command.h"
+#include "common/listener.h"
+#include "common/peer.h"
 #include "common/unique_fd.h"
-#include "peer.h"
 #include "request_reader.h"
 #include "wait.h"
 
@@ -56,7 +57,6 @@ class CommandSocket {
   };
   using Clients = std::map<int, Client>;
 
-  void Listen();
   void Watch(int fd, int operation, unsigned int events);
   void SetAccepting(bool accepting);
   void Accept();
@@ -65,11 +65,9 @@ class CommandSocket {
   void Take(Client& client, const char* data, size_t size, std::vector<Command>& commands);
   void Expire();
 
-  const std::string path_;
   const PeerRights rights_;
-  UniqueFd lock_;
+  DaemonListener listener_;
   UniqueFd epoll_;
-  UniqueFd listener_;
   bool accepting_ = false;
   Clock::time_point accept_again_ = kNever;
   Clients clients_;

@@ -1,4 +1,4 @@
-#include "peer.h"
+#include "common/peer.h"
 
 #include <grp.h>
 #include <pwd.h>
@@ -9,7 +9,7 @@
 #include <cerrno>
 #include <vector>
 
-namespace quarrox::fileindexd {
+namespace quarrox {
 namespace {
 
 constexpr char kServiceName[] = "Quarrox";
@@ -61,4 +61,4 @@ bool PeerRights::MayCommand(int socket) const {
   return group_ != kNoGroup && (peer.gid == group_ || IsInGroup(socket));
 }
 
-}  // namespace quarrox::fileindexd
+}  // namespace quarrox

@@ -1,13 +1,15 @@
-// Who may give commands.
+// Who may talk to a daemon.
 #pragma once
 
 #include <sys/types.h>
 
-namespace quarrox::fileindexd {
+#include "common/export.h"
+
+namespace quarrox {
 
 // The rights of those who connect. The name service is asked once, when the object is made: a slow one must not hold up
-// the clients.
-class PeerRights {
+// the clients. Thread-safe.
+class QUARROX_API PeerRights {
  public:
   PeerRights();
 
@@ -24,4 +26,4 @@ class PeerRights {
   gid_t group_;
 };
 
-}  // namespace quarrox::fileindexd
+}  // namespace quarrox
