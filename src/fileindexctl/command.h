@@ -67,6 +67,7 @@ int QueueFold(const Arguments& arguments);
 int QueueList(const Arguments& arguments);
 int QueueShow(const Arguments& arguments);
 int Resume(const Arguments& arguments);
+int Search(const Arguments& arguments);
 int ShareList(const Arguments& arguments);
 int ShareShow(const Arguments& arguments);
 int ExplainPath(const Arguments& arguments);

@@ -7,7 +7,7 @@
 #include "common/log.h"
 #include "daemon.h"
 #include "fileindex/communication.h"
-#include "operation_handler.h"
+#include "index_handler.h"
 #include "options.h"
 #include "worker.h"
 
@@ -20,8 +20,8 @@ int Run(const Options& options) {
     Daemon(quarrox::fileindex::kDaemonSocketPath, options.foreground).Run();
     return 0;
   }
-  const auto handler = MakeLoggingHandler(options.share);
-  return Worker(options.share, *handler).Run();
+  IndexHandler handler(options.share);
+  return Worker(options.share, handler).Run();
 }
 
 int Serve(const Options& options) {

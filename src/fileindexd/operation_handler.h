@@ -1,29 +1,32 @@
 // What a share's pending operations are handed to.
 #pragma once
 
-#include <cstddef>
-#include <memory>
-#include <string>
+#include <functional>
 
 #include "fileindex/optree.h"
 
 namespace quarrox::fileindexd {
 
-// One object serves one share in one process; not thread-safe. A pass over the queue hands it each operation in order
-// of acceptance and then commits. A pass that ends early, for whatever reason, is run again from its beginning, so an
+// One object serves one share in one process; not thread-safe. A pass begins, hands over each operation of the queue in
+// order of acceptance, and commits. A pass that ends early, for whatever reason, is run again from its beginning, so an
 // operation may come more than once.
 class OperationHandler {
  public:
+  // Called between any two files, so that a signal ends a long walk soon: what it throws ends the pass and is to be let
+  // through. True where the settings may have changed.
+  using CheckPoint = std::function<bool()>;
+
   virtual ~OperationHandler() = default;
 
-  // Throws where the operation cannot be carried out now; the pass is then tried again later.
+  // Whether a pass is due although no operation is pending. Throws where that cannot be told.
+  virtual bool HasWork() = 0;
+
+  // Each of these throws where the work cannot be done now; the pass is then tried again later.
+  virtual void Begin(const CheckPoint& check_point) = 0;
   virtual void Handle(const fileindex::OP& operation) = 0;
 
-  // When this returns, everything handled since the last commit is durable. Throws where it is not.
+  // When this returns, everything handled since Begin is durable.
   virtual void Commit() = 0;
 };
-
-// Writes each operation to the system log, and how many they were.
-std::unique_ptr<OperationHandler> MakeLoggingHandler(const std::string& share);
 
 }  // namespace quarrox::fileindexd

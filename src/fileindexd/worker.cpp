@@ -82,23 +82,27 @@ void Worker::Arm() {
   }
 }
 
+// Where a pass is to be left, this leaves it.
+bool Worker::IsToldToLookAgain() {
+  if (!TakeSignals()) return false;
+  if (stopping_) throw Interrupted();
+  LookAtPause();
+  return true;
+}
+
 // False where nothing is pending.
 bool Worker::Pass() {
   const std::string path = watch_->path();
   QueueMgr queue(path);
   // A pass that did not end leaves its ".tmp", and perhaps no queue beside it.
-  if (!queue.PrepareTmpQueue() && !IsFileExist(path + ".tmp")) return false;
-  queue.ProcessOP(
-      [this](const std::shared_ptr<fileindex::OP>& operation) {
-        if (TakeSignals()) {
-          if (stopping_) throw Interrupted();
-          LookAtPause();
-        }
-        handler_.Handle(*operation);
-      },
-      true);
+  const bool is_pending = queue.PrepareTmpQueue() || IsFileExist(path + ".tmp");
+  if (!is_pending && !handler_.HasWork()) return false;
+  handler_.Begin([this] { return IsToldToLookAgain(); });
+  if (is_pending) {
+    queue.ProcessOP([this](const std::shared_ptr<fileindex::OP>& operation) { handler_.Handle(*operation); }, true);
+  }
   handler_.Commit();
-  if (queue.DeleteTmp() != 0 && errno != ENOENT) FailCall("unlink " + path + ".tmp");
+  if (is_pending && queue.DeleteTmp() != 0 && errno != ENOENT) FailCall("unlink " + path + ".tmp");
   return true;
 }
 

@@ -1,8 +1,9 @@
 // The process that drains the queue of one share.
 //
 // It runs passes until the queue is empty: the queue is taken aside, its operations are handed out, and what was taken
-// aside is deleted once they are committed. Then it waits in the kernel for the queue to be written. While indexing is
-// paused it hands nothing out; a pass is left where it is, and is run again from its beginning afterwards.
+// aside is deleted once they are committed. A pass is run, too, where the handler has something to do of its own. Then
+// it waits in the kernel for the queue to be written. While indexing is paused it hands nothing out; a pass is left
+// where it is, and is run again from its beginning afterwards.
 //
 // The daemon sends it SIGUSR1 when settings or the state of pausing have changed, and SIGTERM to end it.
 #pragma once
@@ -34,6 +35,7 @@ class Worker {
   void LookAtPause();
   void OpenQueue();
   void Arm();
+  bool IsToldToLookAgain();
   Outcome Drain();
   Outcome TryDrain();
   bool Pass();

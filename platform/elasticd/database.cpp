@@ -1,0 +1,407 @@
+#include "database.h"
+
+#include <xapian.h>
+
+#include <cerrno>
+#include <cstring>
+#include <iostream>
+#include <limits>
+#include <map>
+#include <sstream>
+
+namespace quarrox::elasticd {
+namespace {
+
+// Where a document stands: the identifier of its directory and its name. Numbers follow, each in the slot of its field.
+constexpr Xapian::valueno kPlaceSlot = 0;
+constexpr Xapian::valueno kFirstNumberSlot = 1;
+
+// The first bytes of a place, the identifier in big-endian order.
+constexpr size_t kDirectoryBytes = sizeof(DirectoryId);
+
+// The library commits by itself after so many changes, in the middle of a document's; a transaction keeps it from that.
+constexpr bool kFlushed = true;
+
+[[noreturn]] void Translate(const Xapian::Error& error) {
+  const std::string text = error.get_description();
+  const char* system = error.get_error_string();
+  for (const int no_room : {ENOSPC, EDQUOT, EFBIG}) {
+    if (system != nullptr && strcmp(system, strerror(no_room)) == 0) throw Error(kNoRoom, text);
+  }
+  if (strcmp(error.get_type(), "DatabaseModifiedError") == 0) throw OutdatedReader(text);
+  const bool is_missing = system != nullptr && strcmp(system, strerror(ENOENT)) == 0;
+  const bool is_locked = strcmp(error.get_type(), "DatabaseLockError") == 0;
+  if ((system != nullptr && !is_missing) || is_locked) throw Error(kInputOutput, text);
+  throw DamagedDatabase(text);
+}
+
+// Damage may show as any of the library's exceptions, or as a size that makes no sense.
+template <typename Call>
+auto Guard(Call call) {
+  try {
+    return call();
+  } catch (const Xapian::Error& error) {
+    Translate(error);
+  } catch (const std::length_error& error) {
+    throw DamagedDatabase(error.what());
+  }
+}
+
+std::string ToString(std::string_view text) {
+  return std::string(text);
+}
+
+void SetContent(Xapian::Document& document, const AnalyzedDocument& content) {
+  std::string term;
+  for (const auto& [text, count] : content.terms) {
+    term = text;
+    document.add_term(term, count);
+  }
+  for (const auto& [field, number] : content.numbers) {
+    document.add_value(kFirstNumberSlot + field, Xapian::sortable_serialise(number));
+  }
+}
+
+Xapian::Document MakeDocument(const AnalyzedDocument& content, const std::string& place) {
+  Xapian::Document document;
+  SetContent(document, content);
+  document.add_value(kPlaceSlot, place);
+  return document;
+}
+
+// How often a term is in a document now.
+Xapian::termcount CountOf(const Xapian::Document& document, const std::string& term) {
+  Xapian::TermIterator found = document.termlist_begin();
+  found.skip_to(term);
+  return found != document.termlist_end() && *found == term ? found.get_wdf() : 0;
+}
+
+// Terms are shared by fields, so that one is gone only when nothing is left of its count. One without a count belongs
+// to one field alone, by its prefix.
+void RemoveTerm(Xapian::Document& document, const std::string& term, Xapian::termcount count) {
+  const Xapian::termcount now = count == 0 ? 0 : CountOf(document, term);
+  try {
+    document.remove_term(term);
+  } catch (const Xapian::InvalidArgumentError&) {
+    return;  // it was not there
+  }
+  if (now > count) document.add_term(term, now - count);
+}
+
+void ApplyChanges(Xapian::Document& document, const DocumentChanges& changes) {
+  for (const auto& [term, count] : changes.removed.terms) RemoveTerm(document, ToString(term), count);
+  for (const auto& [field, number] : changes.removed.numbers) document.remove_value(kFirstNumberSlot + field);
+  SetContent(document, changes.added);
+  if (changes.place) document.add_value(kPlaceSlot, *changes.place);
+}
+
+// The keys live beside the postings, in the same tree on disk.
+template <typename Database>
+void ForEachMetadataKey(const Database& database, const std::string& prefix,
+                        const std::function<bool(const std::string&)>& take) {
+  const Xapian::TermIterator end = database.metadata_keys_end(prefix);
+  for (Xapian::TermIterator key = database.metadata_keys_begin(prefix); key != end; ++key) {
+    if (!take(*key)) return;
+  }
+}
+
+// Lets documents through by their place.
+class PlaceSource final : public Xapian::ValuePostingSource {
+ public:
+  PlaceSource(std::shared_ptr<const std::unordered_set<DirectoryId>> directories, std::string name)
+      : Xapian::ValuePostingSource(kPlaceSlot), directories_(std::move(directories)), name_(std::move(name)) {}
+
+  PlaceSource* clone() const override { return new PlaceSource(directories_, name_); }
+  std::string name() const override { return "PlaceSource"; }
+
+  void init(const Xapian::Database& database) override {
+    Xapian::ValuePostingSource::init(database);
+    set_maxweight(0);
+  }
+
+  void next(double) override {
+    Xapian::ValuePostingSource::next(0);
+    SkipOthers();
+  }
+
+  void skip_to(Xapian::docid id, double) override {
+    Xapian::ValuePostingSource::skip_to(id, 0);
+    SkipOthers();
+  }
+
+  bool check(Xapian::docid id, double) override {
+    skip_to(id, 0);
+    return true;
+  }
+
+ private:
+  void SkipOthers() {
+    while (!at_end() && !IsWanted(get_value())) Xapian::ValuePostingSource::next(0);
+  }
+
+  bool IsWanted(const std::string& place) const {
+    if (place.size() < kDirectoryBytes || place.compare(kDirectoryBytes, name_.size(), name_) != 0) return false;
+    DirectoryId directory = 0;
+    for (size_t i = 0; i < kDirectoryBytes; ++i) directory = directory << 8 | static_cast<unsigned char>(place[i]);
+    return directories_->count(directory) != 0;
+  }
+
+  const std::shared_ptr<const std::unordered_set<DirectoryId>> directories_;
+  const std::string name_;
+};
+
+// One document by its identifier.
+class DocumentSource final : public Xapian::PostingSource {
+ public:
+  explicit DocumentSource(Xapian::docid id) : id_(id) {}
+
+  DocumentSource* clone() const override { return new DocumentSource(id_); }
+  std::string name() const override { return "DocumentSource"; }
+  void init(const Xapian::Database&) override { state_ = kBefore; }
+  Xapian::doccount get_termfreq_min() const override { return 0; }
+  Xapian::doccount get_termfreq_est() const override { return 1; }
+  Xapian::doccount get_termfreq_max() const override { return 1; }
+  void next(double) override { state_ = state_ == kBefore ? kAt : kAfter; }
+  void skip_to(Xapian::docid id, double) override { state_ = id <= id_ ? kAt : kAfter; }
+  bool at_end() const override { return state_ == kAfter; }
+  Xapian::docid get_docid() const override { return id_; }
+
+ private:
+  enum State { kBefore, kAt, kAfter };
+  const Xapian::docid id_;
+  State state_ = kBefore;
+};
+
+Xapian::Query Convert(const Query& query);
+
+std::vector<Xapian::Query> ConvertParts(const Query& query) {
+  std::vector<Xapian::Query> parts;
+  parts.reserve(query.parts.size());
+  for (const Query& part : query.parts) parts.push_back(Convert(part));
+  return parts;
+}
+
+Xapian::Query Combine(Xapian::Query::op op, const Query& query) {
+  const std::vector<Xapian::Query> parts = ConvertParts(query);
+  return Xapian::Query(op, parts.begin(), parts.end());
+}
+
+// The first of the parts, and all the others as one.
+Xapian::Query Combine(Xapian::Query::op op, const Query& query, Xapian::Query::op others) {
+  const std::vector<Xapian::Query> parts = ConvertParts(query);
+  if (parts.empty()) return Xapian::Query::MatchNothing;
+  return Xapian::Query(op, parts.front(), Xapian::Query(others, std::next(parts.begin()), parts.end()));
+}
+
+Xapian::Query ConvertNumber(const Query& query) {
+  const Xapian::valueno slot = kFirstNumberSlot + query.field;
+  return Xapian::Query(Xapian::Query::OP_VALUE_RANGE, slot, Xapian::sortable_serialise(query.low),
+                       Xapian::sortable_serialise(query.high));
+}
+
+// Nesting is bounded by the parser of queries.
+Xapian::Query Convert(const Query& query) {
+  using Xapian::Query;
+  switch (query.kind) {
+    case elasticd::Query::kNothing:
+      break;
+    case elasticd::Query::kEverything:
+      return Query::MatchAll;
+    case elasticd::Query::kTerm:
+      return Query(query.term);
+    case elasticd::Query::kBeginning:
+      return Query(Query::OP_WILDCARD, query.term);
+    case elasticd::Query::kNumber:
+      return ConvertNumber(query);
+    case elasticd::Query::kDocument:
+      return Query((new DocumentSource(query.document))->release());
+    case elasticd::Query::kPlace:
+      return Query((new PlaceSource(query.directories, query.term))->release());
+    case elasticd::Query::kAnd:
+      return Combine(Query::OP_AND, query);
+    case elasticd::Query::kOr:
+      return Combine(Query::OP_OR, query);
+    case elasticd::Query::kSame:
+      return Combine(Query::OP_SYNONYM, query);
+    case elasticd::Query::kAndNot:
+      return Combine(Query::OP_AND_NOT, query, Query::OP_OR);
+    case elasticd::Query::kAndPerhaps:
+      return Combine(Query::OP_AND_MAYBE, query, Query::OP_OR);
+    case elasticd::Query::kFilter:
+      return Combine(Query::OP_FILTER, query, Query::OP_AND);
+  }
+  return Query::MatchNothing;
+}
+
+Xapian::doccount Bound(uint64_t number, uint64_t bound) {
+  return static_cast<Xapian::doccount>(std::min(number, bound));
+}
+
+}  // namespace
+
+// Keys are written in order and all at once, before a commit: the tree on disk then grows by full blocks, not by
+// halves.
+struct Writer::Impl {
+  Xapian::WritableDatabase database;
+  std::map<std::string, std::string> pending = {};
+
+  void WritePending() {
+    for (const auto& [key, value] : pending) database.set_metadata(key, value);
+    pending.clear();
+  }
+};
+
+Writer::Writer(const std::string& directory, Mode mode) {
+  Guard([&] {
+    const int action = mode == kCreate ? Xapian::DB_CREATE : Xapian::DB_OPEN;
+    impl_ = std::make_unique<Impl>(Impl{Xapian::WritableDatabase(directory, action | Xapian::DB_BACKEND_GLASS)});
+    impl_->database.begin_transaction(kFlushed);
+  });
+}
+
+// A transaction that is open when its database goes is cancelled.
+Writer::~Writer() {
+  try {
+    impl_.reset();
+  } catch (const Xapian::Error&) {  // nothing that was committed is at stake
+  }
+}
+
+std::string Writer::Get(const std::string& key) const {
+  const auto found = impl_->pending.find(key);
+  if (found != impl_->pending.end()) return found->second;
+  return Guard([&] { return impl_->database.get_metadata(key); });
+}
+
+// Two ordered lists as one, where the pending keys say the last word.
+void Writer::ForEachKey(const std::string& prefix, const std::function<bool(const std::string&)>& take) const {
+  auto pending = impl_->pending.lower_bound(prefix);
+  const auto has_pending = [&] {
+    return pending != impl_->pending.end() && pending->first.compare(0, prefix.size(), prefix) == 0;
+  };
+  // False once no more are wanted.
+  const auto take_pending = [&] {
+    const bool is_there = !pending->second.empty();
+    const std::string& key = (pending++)->first;
+    return !is_there || take(key);
+  };
+  bool going = true;
+  Guard([&] {
+    ForEachMetadataKey(impl_->database, prefix, [&](const std::string& key) {
+      while (going && has_pending() && pending->first < key) going = take_pending();
+      if (!going) return false;
+      going = has_pending() && pending->first == key ? take_pending() : take(key);
+      return going;
+    });
+  });
+  while (going && has_pending()) going = take_pending();
+}
+
+std::string Writer::Place(DocumentId id) const {
+  return Guard([&] { return impl_->database.get_document(id, Xapian::DOC_ASSUME_VALID).get_value(kPlaceSlot); });
+}
+
+void Writer::Set(const std::string& key, const std::string& value) {
+  impl_->pending[key] = value;
+}
+
+DocumentId Writer::NextId() const {
+  return Guard([&] { return impl_->database.get_lastdocid() + 1; });
+}
+
+DocumentId Writer::Add(const AnalyzedDocument& content, const std::string& place) {
+  return Guard([&] { return impl_->database.add_document(MakeDocument(content, place)); });
+}
+
+void Writer::Replace(DocumentId id, const AnalyzedDocument& content, const std::string& place) {
+  Guard([&] { impl_->database.replace_document(id, MakeDocument(content, place)); });
+}
+
+// A document that the database itself has handed out is replaced only in what was changed of it: neither its terms nor
+// its data are touched for a new place.
+void Writer::Change(DocumentId id, const DocumentChanges& changes) {
+  Guard([&] {
+    Xapian::Document document = impl_->database.get_document(id);
+    ApplyChanges(document, changes);
+    impl_->database.replace_document(id, document);
+  });
+}
+
+void Writer::Delete(DocumentId id) {
+  Guard([&] { impl_->database.delete_document(id); });
+}
+
+void Writer::AddSuggestion(const std::string& word) {
+  Guard([&] { impl_->database.add_spelling(word); });
+}
+
+void Writer::Commit() {
+  Guard([&] {
+    impl_->WritePending();
+    impl_->database.commit_transaction();
+    impl_->database.begin_transaction(kFlushed);
+  });
+}
+
+struct Reader::Impl {
+  Xapian::Database database;
+};
+
+Reader::Reader(const std::string& directory) {
+  Guard([&] { impl_ = std::make_unique<Impl>(Impl{Xapian::Database(directory)}); });
+}
+
+Reader::~Reader() = default;
+
+void Reader::Refresh() {
+  Guard([&] { impl_->database.reopen(); });
+}
+
+std::string Reader::Get(const std::string& key) const {
+  return Guard([&] { return impl_->database.get_metadata(key); });
+}
+
+void Reader::ForEachKey(const std::string& prefix, const std::function<bool(const std::string&)>& take) const {
+  Guard([&] { ForEachMetadataKey(impl_->database, prefix, take); });
+}
+
+std::string Reader::Place(DocumentId id) const {
+  return Guard([&] { return impl_->database.get_document(id, Xapian::DOC_ASSUME_VALID).get_value(kPlaceSlot); });
+}
+
+SearchResult Reader::Search(const Query& query, const SearchOptions& options) const {
+  return Guard([&] {
+    Xapian::Enquire enquire(impl_->database);
+    enquire.set_query(Convert(query));
+    Xapian::MultiValueKeyMaker keys;
+    for (const auto& [field, descending] : options.sort) keys.add_value(kFirstNumberSlot + field, descending);
+    if (!options.sort.empty()) enquire.set_sort_by_key_then_relevance(&keys, false);
+    const uint64_t all = impl_->database.get_doccount();
+    const Xapian::MSet found = enquire.get_mset(Bound(options.from, all), Bound(options.size, all));
+    SearchResult result;
+    result.hits.reserve(found.size());
+    for (Xapian::MSetIterator hit = found.begin(); hit != found.end(); ++hit) {
+      result.hits.push_back({*hit, hit.get_weight()});
+    }
+    result.total = found.get_matches_estimated();
+    result.exact = found.get_matches_lower_bound() == found.get_matches_upper_bound();
+    return result;
+  });
+}
+
+std::string Reader::Suggest(const std::string& word) const {
+  return Guard([&] { return impl_->database.get_spelling_suggestion(word); });
+}
+
+bool IsSound(const std::string& directory) {
+  std::ostringstream findings;
+  try {
+    if (Xapian::Database::check(directory, 0, &findings) == 0) return true;
+  } catch (const Xapian::Error& error) {
+    findings << error.get_description() << '\n';
+  }
+  std::cerr << findings.str();
+  return false;
+}
+
+}  // namespace quarrox::elasticd

@@ -1,0 +1,136 @@
+// A database on disk: documents with terms, numbers and a place, and beside them keys with values. Both are committed
+// together, and a process that dies leaves what was last committed.
+//
+// Everything throws Error 618 where there is no room, 617 where the disk fails, and DamagedDatabase where the files are
+// not what was written; a Reader also OutdatedReader. Not logged. One object, one thread at a time.
+#pragma once
+
+#include <functional>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "analysis.h"
+#include "common/error.h"
+#include "error_code.h"
+#include "query.h"
+
+namespace quarrox::elasticd {
+
+class DamagedDatabase : public Error {
+ public:
+  explicit DamagedDatabase(const std::string& reason) : Error(kInputOutput, reason) {}
+};
+
+// The database has been committed twice since the reader was refreshed, which has to be done again.
+class OutdatedReader : public Error {
+ public:
+  explicit OutdatedReader(const std::string& reason) : Error(kInputOutput, reason) {}
+};
+
+// Keys have 1 to 240 bytes, values any number; no value is the empty one.
+class Store {
+ public:
+  virtual ~Store() = default;
+  virtual std::string Get(const std::string& key) const = 0;
+
+  // Hands out the keys that begin with `prefix`, in order of bytes, until `take` returns false. The store must not be
+  // changed meanwhile.
+  virtual void ForEachKey(const std::string& prefix, const std::function<bool(const std::string&)>& take) const = 0;
+
+  // A document's place; empty where there is no such document.
+  virtual std::string Place(DocumentId id) const = 0;
+};
+
+// What changes in a document; what is not named stays.
+struct DocumentChanges {
+  AnalyzedDocument removed;  // terms count what they lose
+  AnalyzedDocument added;    // and what they gain; numbers replace
+  std::optional<std::string> place;
+};
+
+// What the owner has written is seen by itself at once, by readers after a commit. What was not committed is dropped
+// when the object goes, and after any exception the object is good for nothing else.
+class Writer final : public Store {
+ public:
+  // Opens the database in `directory`, or makes an empty one, for which the directory must not exist or be empty.
+  enum Mode { kOpen, kCreate };
+  Writer(const std::string& directory, Mode mode);
+  ~Writer() override;
+  Writer(const Writer&) = delete;
+  Writer& operator=(const Writer&) = delete;
+
+  std::string Get(const std::string& key) const override;
+  void ForEachKey(const std::string& prefix, const std::function<bool(const std::string&)>& take) const override;
+  std::string Place(DocumentId id) const override;
+
+  void Set(const std::string& key, const std::string& value);
+
+  // The identifier that the next Add() gives.
+  DocumentId NextId() const;
+  DocumentId Add(const AnalyzedDocument& content, const std::string& place);
+  void Replace(DocumentId id, const AnalyzedDocument& content, const std::string& place);
+  void Change(DocumentId id, const DocumentChanges& changes);
+  void Delete(DocumentId id);
+
+  // Takes a word into what suggestions are made from.
+  void AddSuggestion(const std::string& word);
+
+  // When this returns, everything is on the disk.
+  void Commit();
+
+ private:
+  struct Impl;
+  std::unique_ptr<Impl> impl_;
+};
+
+struct Hit {
+  DocumentId id;
+  double score;
+};
+
+struct SearchResult {
+  std::vector<Hit> hits;
+  uint64_t total = 0;  // of all that match; an estimate where `exact` is false
+  bool exact = true;
+};
+
+struct SearchOptions {
+  uint64_t from = 0;
+  uint64_t size = ~uint64_t{0};
+  std::vector<std::pair<unsigned int, bool>> sort;  // numbers of fields and whether descending; by score where empty
+};
+
+// Sees what was committed when it was made or last refreshed.
+class Reader final : public Store {
+ public:
+  explicit Reader(const std::string& directory);
+  ~Reader() override;
+  Reader(const Reader&) = delete;
+  Reader& operator=(const Reader&) = delete;
+
+  // Goes on to the last commit.
+  void Refresh();
+
+  std::string Get(const std::string& key) const override;
+  void ForEachKey(const std::string& prefix, const std::function<bool(const std::string&)>& take) const override;
+  std::string Place(DocumentId id) const override;
+
+  SearchResult Search(const Query& query, const SearchOptions& options) const;
+
+  // The word of the suggestions that is most like this one; empty where it is known itself or nothing is like it.
+  std::string Suggest(const std::string& word) const;
+
+ private:
+  struct Impl;
+  std::unique_ptr<Impl> impl_;
+};
+
+// Reads the whole database and prints what is wrong with it to standard error; whether it is sound. It may also crash:
+// it belongs into a process of its own.
+bool IsSound(const std::string& directory);
+
+}  // namespace quarrox::elasticd

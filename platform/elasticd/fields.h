@@ -1,0 +1,63 @@
+// The fields of a document as they are kept: what is given back when a document is loaded.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include <json/json.h>
+
+#include "database.h"
+#include "mapping.h"
+#include "places.h"
+
+namespace quarrox::elasticd {
+
+// Fields that follow from a document's identity: the path itself, its directory, its last component, and the
+// directories above it. They are not kept but made from the document's place, so that a move changes none of them.
+class PathFields {
+ public:
+  explicit PathFields(const Mapping& mapping);
+
+  // Whether the field follows from the identity.
+  bool Has(const std::string& name) const;
+
+  // The one that holds the last component.
+  static std::string name_field();
+
+  // The value of such a field.
+  Json::Value Value(const std::string& name, const std::string& directory, const std::string& base) const;
+
+  // Those whose terms are not kept with the document either: searches for them look at places.
+  const std::vector<std::string>& unindexed() const { return unindexed_; }
+
+  // What stands in the whole path, and what in the path of a directory above it.
+  enum class Kind { kNone, kPath, kDirectory, kName, kAncestor };
+  Kind KindOf(const std::string& name) const;
+
+ private:
+  std::string identity_;
+  std::vector<std::string> unindexed_;
+};
+
+// The fields of a document, parted as they are kept: long texts lie beside the others, compressed, and are only read
+// where they are asked for. Null where there are none or where they were not read.
+struct KeptFields {
+  Json::Value plain;
+  Json::Value texts;
+};
+
+// Parts the fields, without those that follow from the identity and those that are null.
+KeptFields PartFields(const Json::Value& fields, const PathFields& path_fields);
+
+// Writes both parts; the texts only where `texts` says so.
+enum class Texts { kBoth, kLeave };
+void SaveFields(Writer& writer, DocumentId id, const KeptFields& fields, Texts texts);
+KeptFields LoadFields(const Store& store, DocumentId id, Texts texts);
+void DropFields(Writer& writer, DocumentId id);
+
+// What people are handed out of a document: the fields by these names that it has and the mapping stores; every stored
+// one where `names` is empty. Null where there is no such document any more.
+Json::Value ShowFields(const Store& store, const Mapping& mapping, const PathFields& path_fields, DocumentId id,
+                       const std::string& directory, const std::string& base, const std::vector<std::string>& names);
+
+}  // namespace quarrox::elasticd

@@ -1,0 +1,95 @@
+#include <signal.h>
+#include <stdlib.h>
+#include <sys/stat.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <exception>
+#include <memory>
+#include <thread>
+
+#include <systemd/sd-daemon.h>
+
+#include "common/log.h"
+#include "engine.h"
+#include "error_code.h"
+#include "options.h"
+#include "server.h"
+
+namespace {
+
+using namespace quarrox;
+using namespace quarrox::elasticd;
+
+constexpr char kSocketPath[] = "/var/run/vexoelasticd.sock";
+
+void MakeDirectory(const std::string& path) {
+  if (mkdir(path.c_str(), 0700) == 0 || errno == EEXIST) return;
+  const int error = errno;
+  throw Error(kErrSystem, "mkdir " + path + " failed, reason=" + strerror(error));
+}
+
+// Blocked in all threads, so that this one gets them.
+sigset_t BlockSignals() {
+  sigset_t signals;
+  sigemptyset(&signals);
+  sigaddset(&signals, SIGTERM);
+  sigaddset(&signals, SIGINT);
+  pthread_sigmask(SIG_BLOCK, &signals, nullptr);
+  return signals;
+}
+
+// The socket comes first: who has it is the one engine on this machine. Clients are served once the engine is there.
+void Run(const Options& options) {
+  const sigset_t signals = BlockSignals();
+  MakeDirectory(options.data);
+  std::unique_ptr<Engine> engine;
+  Server server(
+      {kSocketPath, options.data + "/spool"},
+      [&](const std::string& request, Answer& answer) { engine->Handle(request, answer); },
+      [](const std::string& reason) { return Engine::Refusal(kMalformedRequest, reason); });
+  engine = std::make_unique<Engine>(options.data);
+  std::thread stopper([&] {
+    int signal = 0;
+    sigwait(&signals, &signal);
+    sd_notify(0, "STOPPING=1");
+    server.Stop();
+  });
+  sd_notify(0, "READY=1");
+  server.Run();
+  stopper.join();
+  engine->Close();
+}
+
+int Serve(const Options& options) {
+  // Whoever goes away while we write to them ends that, not us.
+  signal(SIGPIPE, SIG_IGN);
+  openlog("vexoelasticd", LOG_PID | (options.foreground ? LOG_PERROR : 0), LOG_DAEMON);
+  try {
+    if (!options.check.empty()) return CheckDatabase(options.check);
+    Run(options);
+    return 0;
+  } catch (const std::exception& error) {
+    errno = 0;
+    QUARROX_LOG_FAILURE("%s", error.what());
+    if (!options.foreground) fprintf(stderr, "vexoelasticd: %s\n", error.what());
+    return 1;
+  }
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  // When documents are committed is the engine's own business: by itself Xapian commits after so many of them.
+  setenv("XAPIAN_FLUSH_THRESHOLD", "1000000000", 0);
+  try {
+    const Options options = ParseOptions(argc, argv);
+    if (!options.help) return Serve(options);
+    fputs(kUsage, stdout);
+    return 0;
+  } catch (const UsageError& error) {
+    fprintf(stderr, "vexoelasticd: %s\n\n%s", error.what(), kUsage);
+    return 2;
+  }
+}

@@ -1,0 +1,254 @@
+#include "server.h"
+
+#include <malloc.h>
+#include <sys/epoll.h>
+#include <sys/eventfd.h>
+#include <sys/resource.h>
+
+#include <algorithm>
+#include <atomic>
+#include <cerrno>
+#include <condition_variable>
+#include <cstring>
+#include <mutex>
+#include <system_error>
+#include <thread>
+
+#include "common/error.h"
+#include "common/listener.h"
+#include "common/log.h"
+#include "common/peer.h"
+#include "server_worker.h"
+
+namespace quarrox::elasticd {
+namespace {
+
+constexpr int kMostThreads = 256;
+constexpr int kThreadsKept = 2;  // one waits while the other is busy
+constexpr int kIdleMilliseconds = 10000;
+
+// How long no client is accepted where the process has no descriptor left.
+constexpr std::chrono::seconds kAcceptPause(1);
+
+constexpr size_t kMostConnections = 16384;
+
+// Files of the engine itself.
+constexpr size_t kOtherDescriptors = 512;
+
+constexpr uint64_t kListenerToken = ConnectionTable::kEndToken - 1;
+constexpr uint64_t kStopToken = ConnectionTable::kEndToken - 2;
+constexpr uint64_t kNoToken = ConnectionTable::kEndToken - 3;
+
+constexpr char kStopping[] = "The engine is stopping; ask again when it runs";
+
+// Large requests go back to the system when they are done: by itself the allocator would soon keep them.
+void GiveMemoryBack() {
+  mallopt(M_MMAP_THRESHOLD, 1 << 20);
+}
+
+// As many descriptors as the machine allows. Returns how many clients may have one.
+size_t RaiseLimit() {
+  rlimit limit = {};
+  getrlimit(RLIMIT_NOFILE, &limit);
+  limit.rlim_cur = limit.rlim_max;
+  if (setrlimit(RLIMIT_NOFILE, &limit) != 0) getrlimit(RLIMIT_NOFILE, &limit);
+  const auto descriptors = static_cast<size_t>(limit.rlim_cur);
+  return std::min(kMostConnections, std::max(descriptors / 4, descriptors - std::min(descriptors, kOtherDescriptors)));
+}
+
+}  // namespace
+
+struct Server::Impl {
+  Impl(Settings given, Handler handle, Refuse make_refusal)
+      : settings(std::move(given)),
+        handler(std::move(handle)),
+        refuse(std::move(make_refusal)),
+        listener(settings.path, rights.group(), "vexoelasticd"),
+        epoll(epoll_create1(EPOLL_CLOEXEC)),
+        stop(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)),
+        table(epoll.get(), RaiseLimit()),
+        shared{table, handler, refuse, settings.spool_directory} {
+    GiveMemoryBack();
+    Watch(EPOLL_CTL_ADD, listener.fd(), kListenerToken);
+    Watch(EPOLL_CTL_ADD, stop.get(), kStopToken);
+  }
+
+  void Watch(int operation, int fd, uint64_t token) const;
+  void PassOn(uint64_t& duty);
+  void Spawn();
+  void Work();
+  bool MayLeave();
+  void Leave();
+  void Process(Worker& worker, uint64_t token, uint64_t& duty);
+  UniqueFd AcceptOne(uint64_t& duty);
+  void Accept(Worker& worker, uint64_t& duty);
+  void StopAll(Worker& worker, uint64_t& duty);
+
+  const Settings settings;
+  const Handler handler;
+  const Refuse refuse;
+  const PeerRights rights;
+  std::mutex listener_mutex;  // the listener is closed while others may be about to accept from it
+  DaemonListener listener;
+  const UniqueFd epoll;
+  const UniqueFd stop;
+  ConnectionTable table;
+  Worker::Shared shared;
+  std::atomic<bool> accepting_paused = false;
+  std::atomic<int> waiting = 0;  // threads that wait for events
+  std::atomic<int> threads = 0;  // changed under the mutex
+  std::mutex threads_mutex;
+  std::condition_variable all_left;
+};
+
+// Such an event is one thread's alone until it is passed on.
+void Server::Impl::Watch(int operation, int fd, uint64_t token) const {
+  epoll_event event = {};
+  event.events = EPOLLIN | EPOLLONESHOT;
+  event.data.u64 = token;
+  if (epoll_ctl(epoll.get(), operation, fd, &event) == 0) return;
+  const int error = errno;
+  throw Error(kErrSystem, std::string("The engine cannot wait for its clients: ") + strerror(error));
+}
+
+// Leaves to another thread what this one would still have to do, and sees to it that there is one.
+void Server::Impl::PassOn(uint64_t& duty) {
+  if (duty == kStopToken) {
+    Watch(EPOLL_CTL_MOD, stop.get(), kStopToken);
+  } else if (duty == kListenerToken) {
+    const std::lock_guard lock(listener_mutex);
+    if (listener.fd() >= 0) Watch(EPOLL_CTL_MOD, listener.fd(), kListenerToken);
+  }
+  duty = kNoToken;
+  if (waiting == 0) Spawn();
+}
+
+void Server::Impl::Spawn() {
+  const std::lock_guard lock(threads_mutex);
+  if (threads >= kMostThreads) return;
+  ++threads;
+  ++waiting;
+  try {
+    std::thread([this] {
+      Work();
+      Leave();
+    }).detach();
+  } catch (const std::system_error& error) {
+    --threads;
+    --waiting;
+    errno = 0;
+    QUARROX_LOG_FAILURE("The engine goes on with %d threads, reason: %s", threads.load(), error.what());
+  }
+}
+
+bool Server::Impl::MayLeave() {
+  const std::lock_guard lock(threads_mutex);
+  if (waiting <= kThreadsKept) return false;
+  --waiting;
+  return true;
+}
+
+void Server::Impl::Leave() {
+  const std::lock_guard lock(threads_mutex);
+  if (--threads == 0) all_left.notify_all();
+}
+
+void Server::Impl::Work() {
+  uint64_t duty = kNoToken;
+  Worker worker(shared, [this, &duty] { PassOn(duty); });
+  for (;;) {
+    epoll_event event = {};
+    const int count = epoll_wait(epoll.get(), &event, 1, threads > kThreadsKept ? kIdleMilliseconds : -1);
+    if (count == 0 && MayLeave()) break;
+    if (count <= 0) continue;
+    --waiting;
+    if (event.data.u64 == ConnectionTable::kEndToken && table.empty()) break;
+    Process(worker, event.data.u64, duty);
+    if (duty != kNoToken) PassOn(duty);
+    ++waiting;
+  }
+}
+
+void Server::Impl::Process(Worker& worker, uint64_t token, uint64_t& duty) {
+  switch (token) {
+    case kListenerToken:
+      duty = kListenerToken;
+      return Accept(worker, duty);
+    case kStopToken:
+      duty = kStopToken;
+      return StopAll(worker, duty);
+    case ConnectionTable::kEndToken:
+      return;
+    case ConnectionTable::kTimerToken:
+      if (accepting_paused.exchange(false)) duty = kListenerToken;
+      if (Connection* overdue = table.TakeOverdue()) worker.Serve(*overdue);
+      return;
+    default:
+      if (Connection* ready = table.Take(token)) worker.Serve(*ready);
+  }
+}
+
+UniqueFd Server::Impl::AcceptOne(uint64_t& duty) {
+  const std::lock_guard lock(listener_mutex);
+  if (listener.fd() < 0) return UniqueFd();
+  UniqueFd client = listener.Accept();
+  if (client || errno == EAGAIN || errno == EINTR || errno == ECONNABORTED) return client;
+  QUARROX_LOG_FAILURE("%s", "No client is accepted for a second: accept4 failed");
+  duty = kNoToken;
+  accepting_paused = true;
+  table.WakeAt(Clock::now() + kAcceptPause);
+  return client;
+}
+
+void Server::Impl::Accept(Worker& worker, uint64_t& duty) {
+  UniqueFd client = AcceptOne(duty);
+  if (!client) return;
+  Connection* connection = table.Admit(client);
+  if (connection == nullptr) {
+    const char* const full = "Too many clients are connected; ask again later";
+    Connection* silent = table.TakeSilent();
+    worker.SendRefusal(silent != nullptr ? silent->fd.get() : client.get(), full);
+    if (silent == nullptr) return;
+    table.Release(*silent);
+    connection = table.Admit(client);
+    if (connection == nullptr) return worker.SendRefusal(client.get(), full);
+  }
+  if (rights.MayCommand(connection->fd.get())) return worker.Serve(*connection);
+  worker.Refuse(*connection, "The user may not use the engine; root and the members of the group Quarrox may");
+}
+
+// May come again to a thread that another passed the rest on to.
+void Server::Impl::StopAll(Worker& worker, uint64_t& duty) {
+  {
+    const std::lock_guard lock(listener_mutex);
+    if (listener.fd() >= 0) {
+      table.BeginStop();
+      listener.Withdraw();
+      while (const UniqueFd client = listener.Accept()) worker.SendRefusal(client.get(), kStopping);
+      listener.Close();
+    }
+  }
+  while (Connection* waiter = table.TakeWaiting()) {
+    worker.Serve(*waiter);
+    if (duty == kNoToken) return;
+  }
+  duty = kNoToken;
+  table.AllowEnd();
+}
+
+Server::Server(Settings settings, Handler handler, Refuse refuse)
+    : impl_(std::make_unique<Impl>(std::move(settings), std::move(handler), std::move(refuse))) {}
+
+Server::~Server() = default;
+
+void Server::Run() {
+  for (int i = 0; i < kThreadsKept; ++i) impl_->Spawn();
+  std::unique_lock lock(impl_->threads_mutex);
+  impl_->all_left.wait(lock, [this] { return impl_->threads == 0; });
+}
+
+void Server::Stop() {
+  eventfd_write(impl_->stop.get(), 1);
+}
+
+}  // namespace quarrox::elasticd
