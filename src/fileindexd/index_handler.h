@@ -1,0 +1,63 @@
+// Carries out a share's pending operations on its index.
+//
+// An operation says what to look at, the disk says what is true: a delete of what is there indexes it, a create of what
+// is gone deletes it, and so on. So operations may come in any order and more than once.
+//
+// A pass fails early where the engine is not there, and is not done where the engine that commits is another one than
+// that which took the documents: both are told by the engine's socket file. Where the engine has no such index, it gets
+// one, and everything in the share's folders is indexed, once a pass. The share's status flags say so until that was
+// committed, so that a worker that dies meanwhile begins again. In the same way the folders with which the index was
+// made are written down with it, and what is indexed otherwise since then is done first.
+#pragma once
+
+#include <sys/stat.h>
+
+#include <functional>
+#include <optional>
+#include <string>
+
+#include "index_handler_scope.h"
+#include "index_handler_writer.h"
+#include "operation_handler.h"
+
+namespace quarrox::fileindexd {
+
+class IndexHandler final : public OperationHandler {
+ public:
+  explicit IndexHandler(const std::string& share) : scope_(share), writer_(scope_) {}
+
+  // Where the share's status asks for a reindex.
+  bool HasWork() override;
+  void Begin(const CheckPoint& check_point) override;
+  void Handle(const fileindex::OP& operation) override;
+  void Commit() override;
+
+ private:
+  void CarryOut(const fileindex::OP& operation);
+  void Create(const std::string& path);
+  void RefreshAttributes(const std::string& path);
+  void Delete(const std::string& path);
+  void Rename(const std::string& path, const std::string& path_old);
+  void Compare(const std::string& path, const Kinds& forced);
+  void CompareAll();
+  void FollowFolders();
+  Kinds DifferenceOf(const std::string& path, const std::string& other) const;
+  void Rebuild();
+  bool WithIndex(const std::function<void()>& work);
+  void CheckEngine() const;
+
+  IndexScope scope_;
+  IndexWriter writer_;
+
+  // Of this pass:
+  CheckPoint check_point_;
+  struct stat engine_ = {};                  // its socket file
+  std::optional<FolderKinds> kinds_before_;  // that the index was made with, where that is known
+  FolderKinds kinds_;                        // that it is made with now
+  PathSet compared_;                         // where all that was pending before has been met
+  PathSet refreshed_;                        // and the kinds were seen to
+  bool compared_all_ = false;
+  bool rebuilt_ = false;
+};
+
+}  // namespace quarrox::fileindexd

@@ -1,0 +1,65 @@
+// The kinds of files whose contents the folders of a share index.
+#pragma once
+
+#include <map>
+#include <optional>
+#include <string>
+#include <unordered_set>
+#include <utility>
+#include <vector>
+
+#include <json/json.h>
+
+namespace quarrox::fileindexd {
+
+struct Kinds {
+  bool document = false;
+  bool audio = false;
+  bool video = false;
+  bool photo = false;
+
+  // Reads an object of flags; what is missing or no flag is false.
+  static Kinds Of(const Json::Value& data);
+  Json::Value AsJson() const;
+
+  bool Any() const { return document || audio || video || photo; }
+  // Whether a path's kind is one of them. A file of no known kind goes with any.
+  bool Has(const std::string& path) const;
+
+  bool operator==(const Kinds&) const = default;
+  // Those in which two differ.
+  friend Kinds operator^(const Kinds& a, const Kinds& b) {
+    return {a.document != b.document, a.audio != b.audio, a.video != b.video, a.photo != b.photo};
+  }
+};
+
+// The folders of one share with their kinds. They are written down beside the index when it was made with them, so that
+// a change of the folder list is seen also where the event that tells of it was lost or came to be part of another one.
+// Paths are taken from the share's directory, whose own is empty, so that they outlive a rename of the share.
+class FolderKinds {
+ public:
+  void Add(const std::string& path, const Kinds& kinds) { folders_.emplace(path, kinds); }
+
+  // Of the nearest folder at or above a path, if there is one.
+  std::optional<Kinds> At(const std::string& path) const;
+
+  // The places from which on, downwards, something is indexed otherwise, with the kinds in which it is.
+  std::vector<std::pair<std::string, Kinds>> DifferencesFrom(const FolderKinds& other) const;
+
+  bool operator==(const FolderKinds&) const = default;
+
+  // Nothing where there is no such file; what cannot be read is logged, and counts as if it were not there.
+  static std::optional<FolderKinds> Load(const std::string& file);
+  // A failure is logged: the differences are then found once more.
+  void Save(const std::string& file) const;
+
+ private:
+  std::map<std::string, Kinds> folders_;
+};
+
+// By whole components: whether a path is a directory or lies below it; whether it is one of some, or lies below one.
+using PathSet = std::unordered_set<std::string>;
+bool IsAtOrBelow(const std::string& path, const std::string& directory);
+bool HoldsAtOrAbove(const PathSet& directories, const std::string& path);
+
+}  // namespace quarrox::fileindexd

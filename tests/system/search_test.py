@@ -1,0 +1,117 @@
+#!/usr/bin/env python3
+"""From a change on the disk to the answer of a search, with the real daemons VEXOELASTICD, VEXONOTIFYD and FILEINDEXD."""
+import json
+import os
+import pathlib
+import shutil
+import subprocess
+import time
+import unittest
+
+import private_machine as machine
+
+ETC, VOLUME = pathlib.Path("/var/packages/Quarrox/etc"), pathlib.Path(machine.SCRATCH, "v")
+DOCS, QUEUE, LOG = (VOLUME / place for place in ("docs", "@fileindex/docs/queue", "../log"))
+KINDS = {"document": True, "audio": True, "video": True, "photo": False}
+
+
+def found(*query):
+    status, hits = machine.ctl("search", *query, "--limit", "100000")
+    return sorted(str(pathlib.Path(hit["path"]).relative_to(DOCS)) for hit in hits) if status == 0 else hits
+
+
+class SearchTest(unittest.TestCase):
+    def until_found(self, expected, *query):
+        end = time.monotonic() + 60
+        while (hits := found(*query)) != sorted(expected):
+            self.assertLess(time.monotonic(), end, (query, hits, LOG.read_text()[-3000:]))
+            time.sleep(0.05)
+
+    def start(self, name, *arguments):
+        process = subprocess.Popen([os.environ[name], *arguments], stderr=self.log)
+        self.addCleanup(lambda: (process.kill(), process.wait()))
+        return process
+
+    def tell(self, **event):
+        machine.write(VOLUME / "event", json.dumps({"path": str(DOCS), **event}) + "\n")
+        os.rename(VOLUME / "event", QUEUE)
+
+    def start_engine(self):
+        self.engine = self.start("VEXOELASTICD", "--foreground", "--data", machine.SCRATCH + "/engine")
+
+    def folders(self, *paths):
+        machine.write(ETC / "fileindex.folders", json.dumps([
+            {"path": path, "name": path, "paused": path.endswith("deep"), **KINDS} for path in paths]))
+
+    def setUp(self):
+        for place in (VOLUME, ETC, machine.SCRATCH + "/engine"):
+            shutil.rmtree(place, ignore_errors=True)
+        list(map(os.makedirs, (DOCS / "in/deep", QUEUE.parent)))
+        machine.write("/etc/vexo/shares.conf", "[docs]\npath = %s\n" % DOCS)
+        self.folders("/docs/in", "/docs/in/deep")
+        self.log = self.enterContext(open(LOG, "w"))
+        self.start_engine()
+        self.start("VEXONOTIFYD", "--watch", DOCS, "--queue", QUEUE)
+        self.start("FILEINDEXD", "--foreground")
+        while "watching" not in LOG.read_text():
+            time.sleep(0.01)
+        (DOCS / "in/first.txt").write_text("alpha")
+        self.until_found(["in/first.txt"], "alpha")  # the index was missing, so it was made
+
+    def test_what_changes_on_the_disk_is_what_a_search_finds(self):
+        inside = DOCS / "in"
+        for path in ("in/deep/b.txt", "out.txt", "in/.git/c.txt", "in/photo.jpg", "in/Long name.txt"):
+            machine.write(DOCS / path, "beta " + path)
+        os.symlink("first.txt", inside / "link.txt")
+        self.until_found(["in/deep/b.txt", "in/Long name.txt"], "beta")
+        self.until_found(["in/photo.jpg"], "photo", "--name")  # its name, not what is in it
+        self.assertEqual([found("name.t", "--name", "--type", t) for t in ("c", "c,TXT")], [[], ["in/Long name.txt"]])
+        (inside / "photo.jpg").unlink()
+        (inside / "first.txt").write_text("gamma")
+        os.rename(inside / "Long name.txt", inside / "photo.txt")
+        os.rename(inside / "deep", inside / "moved")
+        self.until_found(["in/first.txt"], "gamma")
+        self.until_found(["in/moved/b.txt", "in/photo.txt"], "beta")
+        self.assertEqual((found("alpha"), found("jpg", "--name")), ([], []))
+        os.utime(inside / "first.txt", (0, 0))
+        (inside / "moved/b.txt").write_text("beta")
+        self.until_found(["in/photo.txt"], "in beta")
+        self.assertEqual([(hit["size"], hit["changed"]) for hit in machine.ctl("search", "gamma")[1]], [(5, 0)])
+        shutil.rmtree(inside / "moved")
+        self.until_found(["in/photo.txt"], "beta")
+
+    def test_a_folder_list_that_changed_is_followed(self):
+        (DOCS / "out.txt").write_text("alpha")
+        self.folders("/docs")
+        self.tell(event=0x20000, data=KINDS)
+        self.until_found(["in/first.txt", "out.txt"], "alpha")
+        KINDS["document"] = False
+        self.addCleanup(KINDS.update, {"document": True})
+        self.folders("/docs")
+        self.tell(event=0x200)  # events were lost, the one about the folder, too
+        self.until_found([], "alpha")
+        self.assertEqual(found("txt", "--name"), ["in/first.txt", "out.txt"])
+
+    def test_nothing_is_lost_when_the_engine_is_killed_in_a_pass_or_its_index_is_gone(self):
+        names = ["in/many/%d/%d.txt" % (i % 20, i) for i in range(4000)]
+        for name in names:
+            machine.write(DOCS / name, "plenty")
+        for seconds in (0.3, 0.6, 0.1):
+            time.sleep(seconds)
+            self.engine.kill()
+            self.start_engine()
+        self.until_found(names, "plenty")
+        self.engine.kill()
+        self.engine.wait()
+        for path in filter(pathlib.Path.is_file, (VOLUME / "@fileindex/docs/db").rglob("*")):
+            path.write_bytes(b"damaged")
+        os.rename(DOCS / "in/many/7", DOCS / "in/many/new")
+        self.start_engine()
+        self.until_found([name.replace("/7/", "/new/") for name in names], "plenty")
+        while json.loads((ETC / "fileindex.status").read_text())["share"]["docs"] != 0:
+            time.sleep(0.01)
+
+
+if __name__ == "__main__":
+    machine.enter()
+    unittest.main()
