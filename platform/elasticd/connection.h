@@ -52,6 +52,7 @@ struct Connection {
   RequestReader reader;
   std::string leftover;  // bytes of the next requests, received while an answer waits to be read
   std::unique_ptr<Outgoing> outgoing;
+  uint32_t answers = 0;
 
   size_t Memory() const { return reader.memory() + leftover.capacity(); }
 

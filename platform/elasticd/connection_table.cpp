@@ -96,6 +96,7 @@ Connection* ConnectionTable::Admit(UniqueFd& fd) {
   ++count_;
   connection.fd = std::move(fd);
   connection.stage = Stage::kIdle;
+  connection.answers = 0;
   return Own(connection);
 }
 
@@ -104,6 +105,12 @@ Connection* ConnectionTable::Own(Connection& connection) {
   connection.owned = true;
   if (connection.stage <= Stage::kReceiving) TryReserve(connection, kChunk);
   return &connection;
+}
+
+// The caller has one of them.
+bool ConnectionTable::IsOnly(const Connection&) const {
+  const std::lock_guard lock(mutex_);
+  return count_ == 1;
 }
 
 Connection* ConnectionTable::Take(uint64_t token) {

@@ -60,6 +60,9 @@ class ConnectionTable {
   // Whether the connection may take this much memory. Else it has been handed back and waits for that.
   bool Reserve(Connection& connection, size_t memory);
 
+  // Whether nobody else is connected.
+  bool IsOnly(const Connection& connection) const;
+
   // A request is to be carried out: its time to arrive is over.
   void Unlist(Connection& connection);
 
@@ -100,7 +103,7 @@ class ConnectionTable {
   const size_t most_;
   UniqueFd timer_;
   UniqueFd end_;
-  std::mutex mutex_;
+  mutable std::mutex mutex_;
   std::deque<Connection> places_;
   std::vector<uint32_t> free_;
   size_t count_ = 0;

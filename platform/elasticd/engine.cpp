@@ -72,6 +72,8 @@ SearchRequest ParseSearch(const Json::Value& query) {
   return search;
 }
 
+constexpr char kUpsert[] = "document_upsert_by_id";
+
 std::string Failure(const Error& error) {
   return Engine::Refusal(error.code, error.reason);
 }
@@ -104,7 +106,7 @@ const std::map<std::string, Engine::Command>& Engine::Commands() {
       {"index_pause", {&Engine::IndexPause, false}},
       {"index_resume", {&Engine::IndexResume, false}},
       {"index_config_set", {&Engine::IndexConfigSet, false}},
-      {"document_upsert_by_id", {&Engine::DocumentUpsert, false}},
+      {kUpsert, {&Engine::DocumentUpsert, false}},
       {"document_set_by_id", {&Engine::DocumentSet, false}},
       {"document_del_by_id", {&Engine::DocumentDelete, false}},
       {"document_del_by_query", {&Engine::DocumentDeleteByQuery, false}},
@@ -144,12 +146,18 @@ void Engine::Close() {
   for (const auto& [id, index] : indexes_) index->Close();
 }
 
-void Engine::Handle(const std::string& request, Answer& answer) {
+Engine::Rest Engine::Handle(const std::string& request, Answer& answer, const MakeWay& make_way) {
+  Rest rest;
   try {
     AsErrors([&] {
       Json::Value parsed;
       if (!fromString(parsed, request)) throw Error(kMalformedRequest, "The request is no JSON text");
       if (!parsed.isObject()) throw Error(kMalformedRequest, "The request must be an object");
+      if (parsed["command"] == kUpsert && parsed["data"].isObject() && !parsed.isMember("compound")) {
+        rest = Upsert(parsed["data"], answer, make_way);
+        return;
+      }
+      make_way();
       if (parsed.isMember("compound")) {
         HandleCompound(parsed["compound"], answer);
       } else {
@@ -160,6 +168,18 @@ void Engine::Handle(const std::string& request, Answer& answer) {
     answer.Clear();
     answer.Append(Failure(error));
   }
+  return rest;
+}
+
+// The one command that comes by the thousand: it is answered as soon as it cannot be refused any more, so that the
+// client goes on to the next document while this one is indexed.
+Engine::Rest Engine::Upsert(Json::Value& data, Answer& answer, const MakeWay& make_way) {
+  const IndexPointer index = Get(data);
+  const std::string path = Text(data, "doc_id");
+  Object(data, "data");
+  index->Accept(path, data["data"], make_way);
+  answer.Append("{\"success\":true}");
+  return [index, &make_way] { index->Settle(make_way); };
 }
 
 void Engine::HandleCompound(const Json::Value& items, Answer& answer) {

@@ -1,6 +1,7 @@
 // The search engine: its indexes and the commands that it takes.
 #pragma once
 
+#include <functional>
 #include <map>
 #include <memory>
 #include <mutex>
@@ -24,8 +25,11 @@ class Engine {
   explicit Engine(const std::string& data_directory);
   ~Engine();
 
-  // Carries out a request and makes the answer to it, whatever it is. Never throws.
-  void Handle(const std::string& request, Answer& answer);
+  // Carries out a request and makes the answer to it, whatever it is, and returns what is left to do after the answer,
+  // which may be nothing. Neither throws. `make_way` is called before what may take long.
+  using MakeWay = std::function<void()>;
+  using Rest = std::function<void()>;
+  Rest Handle(const std::string& request, Answer& answer, const MakeWay& make_way);
 
   // The answer to a request that is refused.
   static std::string Refusal(ErrorCode code, const std::string& reason);
@@ -40,6 +44,7 @@ class Engine {
 
   static const std::map<std::string, Command>& Commands();
 
+  Rest Upsert(Json::Value& data, Answer& answer, const MakeWay& make_way);
   void HandleCompound(const Json::Value& items, Answer& answer);
   void Execute(const Json::Value& request, Answer& answer);
   IndexPointer Find(const std::string& id);

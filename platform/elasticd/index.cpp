@@ -59,6 +59,14 @@ struct Index::Open {
   PlaceWriter places;
   DocumentAnalyzer analyzer;
   DocumentAnalyzer other_analyzer;
+  // A document that was accepted and is not indexed yet. Whoever looks at the database finishes it first.
+  struct Accepted {
+    std::string path;
+    Json::Value fields;
+    const AnalyzedDocument* content;  // of `analyzer`, which does nothing else meanwhile
+  };
+
+  std::optional<Accepted> accepted;
   bool marked = true;        // nothing was changed since the database was closed in order
   size_t pending = 0;        // documents that are not committed
   size_t pending_bytes = 0;  // and the size of their texts
@@ -101,7 +109,7 @@ Index::Open& Index::Opened() {
 
 // Drops everything since the last commit: of a change that failed half way nobody knows what is there.
 void Index::Lose(const Error& error) {
-  const bool any = open_ && open_->pending != 0;
+  const bool any = open_ && (open_->pending != 0 || open_->accepted);
   open_.reset();
   if (any && !lost_) lost_.emplace(error.code, "Changes accepted since the last commit are lost: " + error.reason);
 }
@@ -119,26 +127,34 @@ void Index::SetAside(const std::string& why) {
 
 // Runs a change, or a look at what may not be committed yet.
 template <typename Work>
-auto Index::Run(Access access, Work work) {
-  if (waiting_ >= kMostWaiting) throw Error(kTooManyRequests, "Too many requests wait for " + files_.path());
-  ++waiting_;
-  std::unique_lock lock(mutex_);
-  --waiting_;
+auto Index::Run(Access access, Work work, const MakeWay* make_way) {
+  std::unique_lock lock(mutex_, std::try_to_lock);
+  if (!lock || state_ != State::kReady || !open_) {
+    if (make_way != nullptr) (*make_way)();
+    if (waiting_ >= kMostWaiting) throw Error(kTooManyRequests, "Too many requests wait for an index");
+    ++waiting_;
+    if (!lock) lock.lock();
+    --waiting_;
+  }
   WaitForRecovery(lock);
   CheckState();
+  bool failing = false;  // whether a failure leaves changes half done
   try {
     Open& open = Opened();
     if (access == Access::kChange && std::exchange(open.marked, false)) files_.RemoveMark();
+    failing = access == Access::kChange || open.accepted;
+    Finish(open, make_way);
+    failing = access == Access::kChange;
     return work(open);
   } catch (const DamagedDatabase& error) {
     SetAside(error.reason);
     throw Error(kNoSuchIndex, "The index at " + files_.path() + " is damaged: " + error.reason);
   } catch (const Error& error) {
-    if (access == Access::kChange && !IsRefusal(error.code)) Lose(error);
+    if (failing && !IsRefusal(error.code)) Lose(error);
     throw;
   } catch (const std::exception& error) {
     const Error failure(kInputOutput, error.what());
-    if (access == Access::kChange) Lose(failure);
+    if (failing) Lose(failure);
     throw failure;
   }
 }
@@ -156,6 +172,7 @@ void Index::CloseNow() {
   if (!open_) return;
   const std::unique_ptr<Open> open = std::move(open_);
   try {
+    Finish(*open);
     if (open->marked) return;
     open->writer.Commit();
   } catch (const Error& error) {
@@ -255,7 +272,7 @@ void Index::Delete() {
 }
 
 // Counts a change, and writes a portion to the disk when it is large enough.
-void Index::Account(Open& open, const Json::Value& fields) {
+void Index::Account(Open& open, const Json::Value& fields, const MakeWay* make_way) {
   ++open.pending;
   for (const Json::Value& field : fields) {
     const char* begin = nullptr;
@@ -263,33 +280,71 @@ void Index::Account(Open& open, const Json::Value& fields) {
     if (field.getString(&begin, &end)) open.pending_bytes += static_cast<size_t>(end - begin);
   }
   if (open.pending < kPortionDocuments && open.pending_bytes < kPortionBytes) return;
+  if (make_way != nullptr) (*make_way)();
   open.writer.Commit();
   open.pending = 0;
   open.pending_bytes = 0;
 }
 
+void Index::Check(const std::string& path, const Json::Value& fields) const {
+  if (path.front() != '/') throw Error(kBadArgument, "A document's path begins with a slash: '" + path + "' does not");
+  for (const Field& field : mapping_.fields()) {
+    if (field.required && !fields.isMember(field.name)) {
+      throw Error(kBadArgument, "The document of " + path + " lacks its " + field.name);
+    }
+  }
+  if (fields.isMember(mapping_.identity()) && fields[mapping_.identity()] != path) {
+    throw Error(kBadArgument, "The document of " + path + " has another " + mapping_.identity());
+  }
+}
+
+void Index::Save(Open& open, const std::string& path, const Json::Value& fields, const AnalyzedDocument& content) {
+  DocumentId id = open.places.Find(path);
+  if (id != 0) {
+    open.writer.Replace(id, content, open.writer.Place(id));
+  } else {
+    id = open.writer.NextId();
+    const Place place = open.places.Put(path, id);
+    open.writer.Add(content, PackPlace(place));
+  }
+  SaveFields(open.writer, id, PartFields(fields, path_fields_), Texts::kBoth);
+}
+
+// Indexes the document that was accepted last.
+void Index::Finish(Open& open, const MakeWay* make_way) {
+  if (!open.accepted) return;
+  Save(open, open.accepted->path, open.accepted->fields, *open.accepted->content);
+  const Json::Value fields = std::move(open.accepted->fields);
+  open.accepted.reset();
+  Account(open, fields, make_way);
+}
+
 void Index::Upsert(const std::string& path, const Json::Value& fields) {
+  Check(path, fields);
   Run(Access::kChange, [&](Open& open) {
-    for (const Field& field : mapping_.fields()) {
-      if (field.required && !fields.isMember(field.name)) {
-        throw Error(kBadArgument, "The document of " + path + " lacks its " + field.name);
-      }
-    }
-    if (fields.isMember(mapping_.identity()) && fields[mapping_.identity()] != path) {
-      throw Error(kBadArgument, "The document of " + path + " has another " + mapping_.identity());
-    }
-    DocumentId id = open.places.Find(path);
-    const AnalyzedDocument& content = open.analyzer.Analyze(fields, path_fields_.unindexed());
-    if (id != 0) {
-      open.writer.Replace(id, content, open.writer.Place(id));
-    } else {
-      id = open.writer.NextId();
-      const Place place = open.places.Put(path, id);
-      open.writer.Add(content, PackPlace(place));
-    }
-    SaveFields(open.writer, id, PartFields(fields, path_fields_), Texts::kBoth);
+    Save(open, path, fields, open.analyzer.Analyze(fields, path_fields_.unindexed()));
     Account(open, fields);
   });
+}
+
+void Index::Accept(const std::string& path, Json::Value& fields, const MakeWay& make_way) {
+  Check(path, fields);
+  const auto accept = [&](Open& open) {
+    const AnalyzedDocument& content = open.analyzer.Analyze(fields, path_fields_.unindexed());
+    open.accepted.emplace(Open::Accepted{path, Json::Value(), &content});
+    open.accepted->fields.swap(fields);
+  };
+  Run(Access::kChange, accept, &make_way);
+}
+
+// A failure is told by the next commit.
+void Index::Settle(const MakeWay& make_way) {
+  try {
+    Run(
+        Access::kChange, [](Open&) {}, &make_way);
+  } catch (const Error&) {
+    return;
+  }
 }
 
 void Index::Set(const std::string& path, const Json::Value& fields) {

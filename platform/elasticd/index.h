@@ -3,6 +3,7 @@
 
 #include <atomic>
 #include <condition_variable>
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -74,6 +75,14 @@ class Index {
   void Delete();
 
   void Upsert(const std::string& path, const Json::Value& fields);
+
+  // The same in two steps. Accept() refuses what can be refused and takes the fields away; what happens to the document
+  // afterwards is as with any accepted change. Settle() indexes it, unless somebody had to do so before. Both call
+  // `make_way` before they wait or write much. Settle() throws nothing.
+  using MakeWay = std::function<void()>;
+  void Accept(const std::string& path, Json::Value& fields, const MakeWay& make_way);
+  void Settle(const MakeWay& make_way);
+
   void Set(const std::string& path, const Json::Value& fields);
   void Remove(const std::string& path);
   void RemoveMatching(const Json::Value& qsl);
@@ -98,7 +107,7 @@ class Index {
   enum class Access { kLook, kChange };
 
   template <typename Work>
-  auto Run(Access access, Work work);
+  auto Run(Access access, Work work, const MakeWay* make_way = nullptr);
   template <typename Work>
   void Administer(Work work);
   void CheckState() const;
@@ -107,7 +116,10 @@ class Index {
   void CloseNow();
   void Lose(const Error& error);
   void SetAside(const std::string& why);
-  void Account(Open& open, const Json::Value& fields);
+  void Account(Open& open, const Json::Value& fields, const MakeWay* make_way = nullptr);
+  void Check(const std::string& path, const Json::Value& fields) const;
+  void Save(Open& open, const std::string& path, const Json::Value& fields, const AnalyzedDocument& content);
+  void Finish(Open& open, const MakeWay* make_way = nullptr);
 
   void Drop(Open& open, DocumentId id, const std::string& path);
   void DropBelow(Open& open, const std::string& prefix);

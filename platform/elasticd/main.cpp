@@ -47,7 +47,9 @@ void Run(const Options& options) {
   std::unique_ptr<Engine> engine;
   Server server(
       {kSocketPath, options.data + "/spool"},
-      [&](const std::string& request, Answer& answer) { engine->Handle(request, answer); },
+      [&](const std::string& request, Answer& answer, const Server::MakeWay& make_way) {
+        return engine->Handle(request, answer, make_way);
+      },
       [](const std::string& reason) { return Engine::Refusal(kMalformedRequest, reason); });
   engine = std::make_unique<Engine>(options.data);
   std::thread stopper([&] {

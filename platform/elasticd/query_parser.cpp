@@ -242,13 +242,15 @@ Query QueryParser::Bool(const Json::Value& clauses, int depth) const {
       Fail(name + " must be a query or an array of queries");
     }
   }
-  const bool has_must = !must.empty();
-  const bool has_should = !should.empty();
-  Query query = has_must ? Simplify(Query::kAnd, std::move(must)) : Simplify(Query::kOr, std::move(should));
-  if (!has_must && !has_should) query = Query{Query::kEverything};
-  if (has_must && has_should) {
-    should.insert(should.begin(), std::move(query));
-    query = Query::Of(Query::kAndPerhaps, std::move(should));
+  Query query{Query::kEverything};
+  if (must.empty() && !should.empty()) {
+    query = Simplify(Query::kOr, std::move(should));
+  } else if (!must.empty()) {
+    query = Simplify(Query::kAnd, std::move(must));
+    if (!should.empty()) {
+      should.insert(should.begin(), std::move(query));
+      query = Query::Of(Query::kAndPerhaps, std::move(should));
+    }
   }
   if (must_not.empty()) return query;
   must_not.insert(must_not.begin(), std::move(query));

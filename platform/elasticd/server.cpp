@@ -26,6 +26,7 @@ namespace {
 constexpr int kMostThreads = 256;
 constexpr int kThreadsKept = 2;  // one waits while the other is busy
 constexpr int kIdleMilliseconds = 10000;
+constexpr int kLingerMilliseconds = 1;  // a client needs some microseconds to close
 
 // How long no client is accepted where the process has no descriptor left.
 constexpr std::chrono::seconds kAcceptPause(1);
@@ -41,9 +42,13 @@ constexpr uint64_t kNoToken = ConnectionTable::kEndToken - 3;
 
 constexpr char kStopping[] = "The engine is stopping; ask again when it runs";
 
-// Large requests go back to the system when they are done: by itself the allocator would soon keep them.
-void GiveMemoryBack() {
+// Large requests go back to the system when they are done: by itself the allocator would soon keep them. All threads
+// share what is left, because any of them goes on where another one stopped; it is not given back and asked for again
+// with every request.
+void SetUpMemory() {
   mallopt(M_MMAP_THRESHOLD, 1 << 20);
+  mallopt(M_ARENA_MAX, 1);
+  mallopt(M_TRIM_THRESHOLD, 32 << 20);
 }
 
 // As many descriptors as the machine allows. Returns how many clients may have one.
@@ -68,7 +73,7 @@ struct Server::Impl {
         stop(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)),
         table(epoll.get(), RaiseLimit()),
         shared{table, handler, refuse, settings.spool_directory} {
-    GiveMemoryBack();
+    SetUpMemory();
     Watch(EPOLL_CTL_ADD, listener.fd(), kListenerToken);
     Watch(EPOLL_CTL_ADD, stop.get(), kStopToken);
   }
@@ -82,6 +87,7 @@ struct Server::Impl {
   void Process(Worker& worker, uint64_t token, uint64_t& duty);
   UniqueFd AcceptOne(uint64_t& duty);
   void Accept(Worker& worker, uint64_t& duty);
+  void Welcome(Worker& worker, UniqueFd& client);
   void StopAll(Worker& worker, uint64_t& duty);
 
   const Settings settings;
@@ -158,7 +164,12 @@ void Server::Impl::Work() {
   Worker worker(shared, [this, &duty] { PassOn(duty); });
   for (;;) {
     epoll_event event = {};
-    const int count = epoll_wait(epoll.get(), &event, 1, threads > kThreadsKept ? kIdleMilliseconds : -1);
+    const int patience = worker.lingers() ? kLingerMilliseconds : threads > kThreadsKept ? kIdleMilliseconds : -1;
+    const int count = epoll_wait(epoll.get(), &event, 1, patience);
+    if (worker.lingers()) {
+      worker.SettleLingering();
+      if (count == 0) continue;
+    }
     if (count == 0 && MayLeave()) break;
     if (count <= 0) continue;
     --waiting;
@@ -200,9 +211,18 @@ UniqueFd Server::Impl::AcceptOne(uint64_t& duty) {
   return client;
 }
 
+// Goes on while there is somebody to accept and nobody else was asked to: waking another thread for that costs more than
+// a small request.
 void Server::Impl::Accept(Worker& worker, uint64_t& duty) {
-  UniqueFd client = AcceptOne(duty);
-  if (!client) return;
+  while (duty == kListenerToken) {
+    UniqueFd client = AcceptOne(duty);
+    if (!client) return;
+    if (worker.lingers()) worker.SettleLingering();
+    Welcome(worker, client);
+  }
+}
+
+void Server::Impl::Welcome(Worker& worker, UniqueFd& client) {
   Connection* connection = table.Admit(client);
   if (connection == nullptr) {
     const char* const full = "Too many clients are connected; ask again later";

@@ -1,9 +1,9 @@
 // The engine's socket: many connections, each with requests in frames, each request with one answer.
 //
 // A few threads wait for whatever connection has something to say; the one that has read a whole request carries it out
-// and writes the answer, and sees to it that another thread waits meanwhile. So a request that takes long holds up
-// nobody but its own client. A frame is a 4-byte length in host byte order and that many bytes, the last of which is
-// zero.
+// and writes the answer, and sees to it that another thread waits meanwhile, where there is another client or it takes
+// long. So a request that takes long holds up nobody but its own client. A frame is a 4-byte length in host byte order
+// and that many bytes, the last of which is zero.
 //
 // Bounded whatever clients do: the memory of all requests that are being received, the number of connections, the
 // time that a connection may take to send a request, and the time that it may leave an answer unread. What is refused
@@ -20,8 +20,17 @@ namespace quarrox::elasticd {
 
 class Server {
  public:
-  // Carries out a request and makes the answer. Called from any thread, also at the same time; must not throw.
-  using Handler = std::function<void(const std::string& request, Answer& answer)>;
+  // Sees to it that another thread waits for clients. Calling it more than once is as good as once.
+  using MakeWay = std::function<void()>;
+
+  // What is left to do for a request after its answer; may be empty.
+  using Rest = std::function<void()>;
+
+  // Carries out a request and makes the answer. Called from any thread, also at the same time. Must not throw, nor must
+  // the rest that it returns. Both call `make_way`, which lives as long as they run, before anything that takes longer
+  // than a moment: where a single client asks one thing after the other, its thread need not hand over to another one
+  // each time.
+  using Handler = std::function<Rest(const std::string& request, Answer& answer, const MakeWay& make_way)>;
 
   // Makes the answer to a request that never reached the handler; `reason` is for people.
   using Refuse = std::function<std::string(const std::string& reason)>;

@@ -1,9 +1,11 @@
 #include "server_worker.h"
 
+#include <poll.h>
 #include <sys/socket.h>
 
 #include <cerrno>
 #include <new>
+#include <utility>
 
 #include "common/error.h"
 #include "common/log.h"
@@ -13,6 +15,9 @@ namespace {
 
 // What answers that wait for their clients may take in memory; further ones go to their files.
 constexpr size_t kUnreadInMemory = size_t{32} << 20;
+
+// How long a new client is waited for by the thread that has accepted it.
+constexpr int kSoonMilliseconds = 1;
 
 using Parked = ConnectionTable::Parked;
 
@@ -43,16 +48,38 @@ void Worker::Read(Connection& connection) {
     if (count > 0) {
       const auto size = static_cast<size_t>(count);
       if (!Consume(connection, {buffer_, size})) return;
-      if (size < sizeof(buffer_)) return AwaitRequest(connection);
+      if (size < sizeof(buffer_)) return Linger(connection);
       make_way_();
     } else if (count == 0) {
       return End(connection);
     } else if (errno == EAGAIN) {
-      return AwaitRequest(connection);
+      if (!ComesSoon(connection)) return AwaitRequest(connection);
     } else if (errno != EINTR) {
       return table_.Release(connection);
     }
   }
+}
+
+// Who has connected is about to say why. Where nobody else is there, waiting for that costs less than handing over.
+bool Worker::ComesSoon(const Connection& connection) const {
+  if (connection.answers != 0 || !connection.reader.empty() || !table_.IsOnly(connection)) return false;
+  pollfd ready = {connection.fd.get(), POLLIN, 0};
+  return poll(&ready, 1, kSoonMilliseconds) == 1;
+}
+
+// One that goes on asking is waited for as any other.
+void Worker::Linger(Connection& connection) {
+  if (connection.answers != 1 || !connection.reader.empty() || lingering_ != nullptr) return AwaitRequest(connection);
+  lingering_ = &connection;
+}
+
+// What it asks next is left to whoever waits for it: this thread may have another event at hand.
+void Worker::SettleLingering() {
+  Connection& connection = *std::exchange(lingering_, nullptr);
+  ++connection.answers;
+  char byte;
+  if (recv(connection.fd.get(), &byte, sizeof(byte), MSG_PEEK | MSG_DONTWAIT) == 0) return End(connection);
+  AwaitRequest(connection);
 }
 
 // Its client has closed its end, so nothing needs to be drained.
@@ -83,11 +110,21 @@ bool Worker::Consume(Connection& connection, std::string_view data) {
 
 // False where the connection was handed back, with `rest` for later.
 bool Worker::CarryOut(Connection& connection, std::string_view rest) {
-  make_way_();
+  if (!table_.IsOnly(connection)) make_way_();
   if (connection.listed) table_.Unlist(connection);
   answer_->Clear();
-  shared_.handler(connection.reader.text(), *answer_);
+  const Server::Rest todo = shared_.handler(connection.reader.text(), *answer_, make_way_);
+  const bool goes_on = SendAnswer(connection, rest);
+  if (!todo) return goes_on;
+  if (!goes_on || !table_.IsOnly(connection)) make_way_();
+  todo();
+  return goes_on;
+}
+
+// False where the connection was handed back, with `rest` for later.
+bool Worker::SendAnswer(Connection& connection, std::string_view rest) {
   connection.reader.Clear();
+  ++connection.answers;
   if (connection.reserved > ConnectionTable::kChunk) table_.GiveBack(connection);
   AnswerSender sender(*answer_);
   switch (sender.Send(connection.fd.get())) {

@@ -29,6 +29,11 @@ class Worker {
   // Goes on with what the connection waited for, as far as that can be done without waiting.
   void Serve(Connection& connection);
 
+  // A client that has its first answer usually closes at once. Such a connection stays with this thread for a moment
+  // instead of being waited for by all of them. SettleLingering() is to be called soon, at the next event.
+  bool lingers() const { return lingering_ != nullptr; }
+  void SettleLingering();
+
   // Answers with a refusal, and lets the client finish what it writes: closing at once would fail its writing, and it
   // might never look at the answer. Logged.
   void Refuse(Connection& connection, const std::string& reason);
@@ -41,18 +46,22 @@ class Worker {
 
  private:
   void Read(Connection& connection);
+  bool ComesSoon(const Connection& connection) const;
   void Drain(Connection& connection);
   void SendOn(Connection& connection);
   bool Consume(Connection& connection, std::string_view data);
   bool CarryOut(Connection& connection, std::string_view rest);
+  bool SendAnswer(Connection& connection, std::string_view rest);
   void LeaveUnread(Connection& connection, const AnswerSender& sender);
   void AwaitRequest(Connection& connection);
   void End(Connection& connection);
+  void Linger(Connection& connection);
 
   Shared& shared_;
   ConnectionTable& table_;
   const std::function<void()> make_way_;
   std::unique_ptr<Answer> answer_;
+  Connection* lingering_ = nullptr;
   char buffer_[ConnectionTable::kChunk];
 };
 

@@ -14,11 +14,14 @@ int main(int, char** argv) {
   sigemptyset(&signals);
   sigaddset(&signals, SIGTERM);
   pthread_sigmask(SIG_BLOCK, &signals, nullptr);
-  const auto echo = [](const std::string& request, Answer& answer) {
+  const auto echo = [](const std::string& request, Answer& answer, const Server::MakeWay& make_way) {
+    make_way();
     const long number = request.size() > 4 ? atol(request.c_str() + 4) : 0;
     if (request.starts_with("wait")) sleep(static_cast<unsigned int>(number));
-    if (!request.starts_with("big ")) return answer.Append(request);
-    for (long left = number; left > 0; left -= 1000) answer.Append(std::string(1000, 'x'));
+    if (!request.starts_with("big ")) answer.Append(request);
+    for (long left = request.starts_with("big ") ? number : 0; left > 0; left -= 1000)
+      answer.Append(std::string(1000, 'x'));
+    return Server::Rest();
   };
   Server server({argv[1], argv[2]}, echo, [](const std::string& reason) { return reason; });
   int signal = 0;

@@ -50,7 +50,7 @@ class FuzzEngine {
   // Aborts unless the answer is a response.
   void Ask(const std::string& request) {
     elasticd::Answer answer(directory_.path());
-    engine_.Handle(request, answer);
+    if (const auto rest = engine_.Handle(request, answer, make_way_)) rest();
     Json::Value response;
     if (!fromString(response, Text(answer)) || !response["success"].isBool()) abort();
   }
@@ -79,6 +79,7 @@ class FuzzEngine {
 
   TempDir directory_;
   elasticd::Engine engine_;
+  const elasticd::Engine::MakeWay make_way_ = [] {};
 };
 
 }  // namespace quarrox::support

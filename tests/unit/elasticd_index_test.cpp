@@ -101,8 +101,11 @@ class IndexModel : public ::testing::Test {
       case 0:
       case 1: {
         const std::string path = AnyPath();
-        documents_[path] = AnyFields(path);
-        return index_->Upsert(path, documents_[path]);
+        Json::Value fields = documents_[path] = AnyFields(path);
+        if (Below(2) == 0) return index_->Upsert(path, fields);
+        index_->Accept(path, fields, [] {});
+        if (Below(2) == 0) index_->Settle([] {});
+        return;
       }
       case 2: {
         const std::string path = KnownPath();

@@ -53,12 +53,13 @@ ItemResult ReadItem(const Json::Value& item) {
 }  // namespace
 
 void SendRequestImpl(Json::Value& res, const Json::Value& req) {
+  const std::string text = toString(req);  // before connecting, so that the engine need not wait for it
   WaitForSocket();
   vexodaemon::DomainSockConnection conn(kElasticdSocketPath);
   if (!conn.Connect(kElasticdConnectTimeout)) {
     QUARROX_THROW("!conn.Connect(kElasticdConnectTimeout)", kErrEngineReceive, "Connect failed");
   }
-  if (!conn.Send(toString(req))) QUARROX_THROW("!conn.Send(req.toString())", kErrEngineReceive, "Send failed");
+  if (!conn.Send(text)) QUARROX_THROW("!conn.Send(req.toString())", kErrEngineReceive, "Send failed");
 
   std::string resp_raw;
   if (!conn.Recv(resp_raw) || !fromString(res, resp_raw) || !res.isObject() || !res.isMember("success") ||
@@ -77,8 +78,8 @@ void SendRequestImpl(Json::Value& res, const Json::Value& req) {
     const ItemResult item = ReadItem(response["data"][i]);
     if (item.success) continue;
     if (IsElasticdBusy(item.code)) throw Error(static_cast<ErrorCode>(item.code), item.msg);
-    const std::string text = log::Text(toString(req["compound"][i]));
-    QUARROX_LOG_FAILURE("Compound failed: %s (%d) %s", text.c_str(), item.code, log::Text(item.msg).c_str());
+    const std::string what = log::Text(toString(req["compound"][i]));
+    QUARROX_LOG_FAILURE("Compound failed: %s (%d) %s", what.c_str(), item.code, log::Text(item.msg).c_str());
   }
 }
 
