@@ -110,7 +110,7 @@ Connection* ConnectionTable::Own(Connection& connection) {
 // The caller has one of them.
 bool ConnectionTable::IsOnly(const Connection&) const {
   const std::lock_guard lock(mutex_);
-  return count_ == 1;
+  return count_ <= 1 + static_cast<size_t>(leaving_);
 }
 
 Connection* ConnectionTable::Take(uint64_t token) {

@@ -60,8 +60,9 @@ class ConnectionTable {
   // Whether the connection may take this much memory. Else it has been handed back and waits for that.
   bool Reserve(Connection& connection, size_t memory);
 
-  // Whether nobody else is connected.
+  // Whether nobody else is connected, save those who are expected to go.
   bool IsOnly(const Connection& connection) const;
+  void ExpectToGo(bool expected) { leaving_ += expected ? 1 : -1; }
 
   // A request is to be carried out: its time to arrive is over.
   void Unlist(Connection& connection);
@@ -107,6 +108,7 @@ class ConnectionTable {
   std::deque<Connection> places_;
   std::vector<uint32_t> free_;
   size_t count_ = 0;
+  std::atomic<int> leaving_ = 0;
   List lists_[static_cast<size_t>(Stage::kStages)];
   Clock::time_point timer_at_ = Clock::time_point::max();
   size_t reserved_ = 0;

@@ -149,11 +149,11 @@ Json::Value PathFields::Value(const std::string& name, const std::string& direct
   return directory.empty() ? "/" : directory;
 }
 
-KeptFields PartFields(const Json::Value& fields, const PathFields& path_fields) {
+KeptFields PartFields(Json::Value fields, const PathFields& path_fields) {
   KeptFields parted{Json::Value(Json::objectValue), Json::Value()};
   for (auto field = fields.begin(); field != fields.end(); ++field) {
     const std::string name = field.name();
-    if (!path_fields.Has(name) && !field->isNull()) (IsLong(*field) ? parted.texts : parted.plain)[name] = *field;
+    if (!path_fields.Has(name) && !field->isNull()) (IsLong(*field) ? parted.texts : parted.plain)[name].swap(*field);
   }
   return parted;
 }

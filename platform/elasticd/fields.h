@@ -47,7 +47,7 @@ struct KeptFields {
 };
 
 // Parts the fields, without those that follow from the identity and those that are null.
-KeptFields PartFields(const Json::Value& fields, const PathFields& path_fields);
+KeptFields PartFields(Json::Value fields, const PathFields& path_fields);
 
 // Writes both parts; the texts only where `texts` says so.
 enum class Texts { kBoth, kLeave };

@@ -45,6 +45,17 @@ std::vector<std::string> SuggestionWords(const Mapping& mapping, const AnalyzedD
   return words;
 }
 
+// Of the texts among the fields.
+size_t BytesOf(const Json::Value& fields) {
+  size_t bytes = 0;
+  for (const Json::Value& field : fields) {
+    const char* begin = nullptr;
+    const char* end = nullptr;
+    if (field.getString(&begin, &end)) bytes += static_cast<size_t>(end - begin);
+  }
+  return bytes;
+}
+
 std::string Base(const std::string& path) {
   return path.substr(path.rfind('/') + 1);
 }
@@ -272,13 +283,9 @@ void Index::Delete() {
 }
 
 // Counts a change, and writes a portion to the disk when it is large enough.
-void Index::Account(Open& open, const Json::Value& fields, const MakeWay* make_way) {
+void Index::Account(Open& open, size_t bytes, const MakeWay* make_way) {
   ++open.pending;
-  for (const Json::Value& field : fields) {
-    const char* begin = nullptr;
-    const char* end = nullptr;
-    if (field.getString(&begin, &end)) open.pending_bytes += static_cast<size_t>(end - begin);
-  }
+  open.pending_bytes += bytes;
   if (open.pending < kPortionDocuments && open.pending_bytes < kPortionBytes) return;
   if (make_way != nullptr) (*make_way)();
   open.writer.Commit();
@@ -298,7 +305,7 @@ void Index::Check(const std::string& path, const Json::Value& fields) const {
   }
 }
 
-void Index::Save(Open& open, const std::string& path, const Json::Value& fields, const AnalyzedDocument& content) {
+void Index::Save(Open& open, const std::string& path, Json::Value fields, const AnalyzedDocument& content) {
   DocumentId id = open.places.Find(path);
   if (id != 0) {
     open.writer.Replace(id, content, open.writer.Place(id));
@@ -307,23 +314,23 @@ void Index::Save(Open& open, const std::string& path, const Json::Value& fields,
     const Place place = open.places.Put(path, id);
     open.writer.Add(content, PackPlace(place));
   }
-  SaveFields(open.writer, id, PartFields(fields, path_fields_), Texts::kBoth);
+  SaveFields(open.writer, id, PartFields(std::move(fields), path_fields_), Texts::kBoth);
 }
 
 // Indexes the document that was accepted last.
 void Index::Finish(Open& open, const MakeWay* make_way) {
   if (!open.accepted) return;
-  Save(open, open.accepted->path, open.accepted->fields, *open.accepted->content);
-  const Json::Value fields = std::move(open.accepted->fields);
+  const size_t bytes = BytesOf(open.accepted->fields);
+  Save(open, open.accepted->path, std::move(open.accepted->fields), *open.accepted->content);
   open.accepted.reset();
-  Account(open, fields, make_way);
+  Account(open, bytes, make_way);
 }
 
 void Index::Upsert(const std::string& path, const Json::Value& fields) {
   Check(path, fields);
   Run(Access::kChange, [&](Open& open) {
     Save(open, path, fields, open.analyzer.Analyze(fields, path_fields_.unindexed()));
-    Account(open, fields);
+    Account(open, BytesOf(fields));
   });
 }
 
@@ -367,7 +374,7 @@ void Index::Set(const std::string& path, const Json::Value& fields) {
     }
     if (!change.after.empty()) SaveFields(open.writer, id, change.kept, change.texts);
     if (changes.place || !change.after.empty()) open.writer.Change(id, changes);
-    Account(open, change.after);
+    Account(open, BytesOf(change.after));
   });
 }
 
@@ -382,7 +389,7 @@ void Index::Remove(const std::string& path) {
     const DocumentId id = open.places.Find(path);
     if (id == 0) return;
     Drop(open, id, path);
-    Account(open, Json::Value());
+    Account(open, 0);
   });
 }
 
@@ -396,7 +403,7 @@ void Index::DropBelow(Open& open, const std::string& prefix) {
     });
     for (const auto& [id, path] : found) {
       Drop(open, id, path);
-      Account(open, Json::Value());
+      Account(open, 0);
     }
   } while (found.size() == kDeletedAtOnce);
 }
@@ -414,7 +421,7 @@ void Index::RemoveMatching(const Json::Value& qsl) {
     const Query parsed = QueryParser(mapping_, path_fields_, places).Parse(qsl);
     for (const Hit& hit : reader.Search(parsed, SearchOptions()).hits) {
       Drop(open, hit.id, open.places.PathOf(UnpackPlace(open.writer.Place(hit.id))));
-      Account(open, Json::Value());
+      Account(open, 0);
     }
   });
 }
@@ -478,7 +485,7 @@ void Index::AddSuggestions(const std::string& path) {
       }
     }
     open.writer.Set(kSuggestionsKey, "1");
-    Account(open, fields.texts);
+    Account(open, BytesOf(fields.texts));
   });
 }
 

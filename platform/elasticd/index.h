@@ -116,9 +116,9 @@ class Index {
   void CloseNow();
   void Lose(const Error& error);
   void SetAside(const std::string& why);
-  void Account(Open& open, const Json::Value& fields, const MakeWay* make_way = nullptr);
+  void Account(Open& open, size_t bytes, const MakeWay* make_way = nullptr);
   void Check(const std::string& path, const Json::Value& fields) const;
-  void Save(Open& open, const std::string& path, const Json::Value& fields, const AnalyzedDocument& content);
+  void Save(Open& open, const std::string& path, Json::Value fields, const AnalyzedDocument& content);
   void Finish(Open& open, const MakeWay* make_way = nullptr);
 
   void Drop(Open& open, DocumentId id, const std::string& path);

@@ -71,11 +71,13 @@ bool Worker::ComesSoon(const Connection& connection) const {
 void Worker::Linger(Connection& connection) {
   if (connection.answers != 1 || !connection.reader.empty() || lingering_ != nullptr) return AwaitRequest(connection);
   lingering_ = &connection;
+  table_.ExpectToGo(true);
 }
 
 // What it asks next is left to whoever waits for it: this thread may have another event at hand.
 void Worker::SettleLingering() {
   Connection& connection = *std::exchange(lingering_, nullptr);
+  table_.ExpectToGo(false);
   ++connection.answers;
   char byte;
   if (recv(connection.fd.get(), &byte, sizeof(byte), MSG_PEEK | MSG_DONTWAIT) == 0) return End(connection);
