@@ -96,6 +96,39 @@ Json::Value Parse(const std::string& text) {
   return parsed;
 }
 
+// A line of JSON with the length of each text, in order of names, and then the texts as they are: escaping them costs
+// more than compressing them. What is no text stands in the line itself.
+std::string JoinTexts(const Json::Value& texts) {
+  Json::Value lengths(Json::objectValue);
+  std::string joined;
+  for (auto text = texts.begin(); text != texts.end(); ++text) {
+    const char* begin = nullptr;
+    const char* end = nullptr;
+    if (text->getString(&begin, &end)) {
+      lengths[text.name()] = Json::UInt64{static_cast<size_t>(end - begin)};
+      joined.append(begin, end);
+    } else {
+      lengths[text.name()] = *text;
+    }
+  }
+  return toString(lengths) + '\n' + joined;
+}
+
+Json::Value PartTexts(const std::string& joined) {
+  const size_t line = joined.find('\n');
+  if (line == std::string::npos) throw DamagedDatabase("the texts of a document have no beginning");
+  Json::Value texts = Parse(joined.substr(0, line));
+  size_t at = line + 1;
+  for (Json::Value& text : texts) {
+    if (!text.isUInt64()) continue;
+    const size_t length = text.asUInt64();
+    if (length > joined.size() - at) throw DamagedDatabase("the texts of a document are cut short");
+    text = Json::Value(joined.data() + at, joined.data() + at + length);
+    at += length;
+  }
+  return texts;
+}
+
 bool IsLong(const Json::Value& value) {
   const char* begin = nullptr;
   const char* end = nullptr;
@@ -161,7 +194,7 @@ KeptFields PartFields(Json::Value fields, const PathFields& path_fields) {
 void SaveFields(Writer& writer, DocumentId id, const KeptFields& fields, Texts texts) {
   writer.Set(FieldsKey(id), Seal(toString(fields.plain)));
   if (texts == Texts::kLeave) return;
-  writer.Set(TextsKey(id), fields.texts.empty() ? std::string() : Compress(toString(fields.texts)));
+  writer.Set(TextsKey(id), fields.texts.empty() ? std::string() : Compress(JoinTexts(fields.texts)));
 }
 
 KeptFields LoadFields(const Store& store, DocumentId id, Texts texts) {
@@ -170,7 +203,7 @@ KeptFields LoadFields(const Store& store, DocumentId id, Texts texts) {
   if (plain.empty()) return fields;
   fields.plain = Parse(Unseal(plain));
   const std::string packed = texts == Texts::kBoth ? store.Get(TextsKey(id)) : std::string();
-  if (!packed.empty()) fields.texts = Parse(Decompress(packed));
+  if (!packed.empty()) fields.texts = PartTexts(Decompress(packed));
   return fields;
 }
 
