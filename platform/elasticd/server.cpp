@@ -211,8 +211,8 @@ UniqueFd Server::Impl::AcceptOne(uint64_t& duty) {
   return client;
 }
 
-// Goes on while there is somebody to accept and nobody else was asked to: waking another thread for that costs more than
-// a small request.
+// Goes on while there is somebody to accept and nobody else was asked to: waking another thread for that costs more
+// than a small request.
 void Server::Impl::Accept(Worker& worker, uint64_t& duty) {
   while (duty == kListenerToken) {
     UniqueFd client = AcceptOne(duty);

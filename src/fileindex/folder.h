@@ -68,6 +68,10 @@ class QUARROX_API Folder {
   std::string GetFullPath() const;
   std::string GetFullPath(ShareVolumes& volumes) const;
 
+  void SetOwner(const std::string& owner) { owner_ = owner; }
+  void SetVolumeToBeClean(const std::string& volume) { volume_to_be_clean_ = volume; }
+  void SetPaused(bool paused) { paused_ = paused; }
+
   // Moves the record to another share: the first component of its path becomes `new_share`. A full path that was
   // asked for before stays as it was; who needs the new one makes a new record of GetData.
   void SetShare(const std::string& new_share);

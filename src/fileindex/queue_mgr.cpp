@@ -5,11 +5,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
-#include <functional>
-#include <iterator>
 #include <optional>
-#include <set>
-#include <string_view>
 
 #include "common/file.h"
 #include "common/log.h"
@@ -17,6 +13,7 @@
 #include "common/strings.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/optree_fold.h"
+#include "fileindex/queue_mgr_folders.h"
 #include "fileindex/queue_mgr_search.h"
 
 namespace quarrox::fileindex {
@@ -36,51 +33,6 @@ std::shared_ptr<OPTree> BuiltTree(const std::string& path) {
   tree->BuildTree();
   return tree;
 }
-
-// Which events say that something is pending for an indexed folder.
-class FolderEvents {
- public:
-  FolderEvents(const std::string& full_path, const FolderMgr& folders)
-      : full_path_(full_path), folders_(folders), is_folder_(folders.IsFullPathHasOwnCfg(full_path)) {}
-
-  bool Accepts(const EventView& event) {
-    if ((event.event & kEventQueueDamaged) != 0) return true;
-    if (Touches(event, event.path)) return true;
-    return (event.event & kEventRename) != 0 && Touches(event, event.path_old) && CanHaveNode(event.path);
-  }
-
- private:
-  static constexpr uint32_t kConcernsAllBelow = kEventReindex | kEventRename;
-  static constexpr uint32_t kConcernsAllBelowDirectory = kEventCreate | kEventDelete;  // they become reindexes
-
-  // From a path that can have no node comes no operation.
-  bool Touches(const EventView& event, std::string_view place) {
-    const uint32_t all_below = kConcernsAllBelow | (event.is_dir ? kConcernsAllBelowDirectory : 0);
-    if ((event.event & all_below) != 0 && IsAtOrBelow(full_path_, place)) return CanHaveNode(place);
-    return is_folder_ && IsAtOrBelow(place, full_path_) && CanHaveNode(place) && IsGoverned(place);
-  }
-  bool IsGoverned(std::string_view place) {
-    const auto next = inner_.upper_bound(place);
-    if (next != inner_.begin() && place.starts_with(*std::prev(next))) return false;
-    const std::shared_ptr<Folder> folder = folders_.GetMostSuitableCfg(NodePath(place));
-    if (folder == nullptr) return false;
-    if (folder->GetFullPath() == full_path_) return true;
-    AddInner(folder->GetFullPath() + "/");
-    return false;
-  }
-  void AddInner(const std::string& prefix) {
-    auto covered = inner_.lower_bound(prefix);
-    while (covered != inner_.end() && covered->starts_with(prefix)) covered = inner_.erase(covered);
-    inner_.insert(prefix);
-  }
-
-  const std::string& full_path_;
-  const FolderMgr& folders_;
-  const bool is_folder_;
-  // The folders below this one that were found to govern an event, with a slash at the end and none below another: so
-  // what sorts before a path is the one that it lies in, if any.
-  std::set<std::string, std::less<>> inner_;
-};
 
 }  // namespace
 

@@ -27,10 +27,12 @@ T Read(const Json::Value& object, const std::string& key, T value) {
   return value;
 }
 
-// The flags of all shares; empty where they are not to be understood.
-Json::Value SharesOf(const Json::Value& state) {
-  const Json::Value shares = Read<Json::Value>(state, kShare, Json::objectValue);
-  return shares.isObject() ? shares : Json::objectValue;
+// The flags of all shares; empty where they are not to be understood. Not copied: who lists folders asks for many.
+const Json::Value& SharesOf(const Json::Value& state) {
+  static const Json::Value none(Json::objectValue);
+  if (!state.isObject()) Read<bool>(state, kShare, false);  // throws
+  const Json::Value& shares = state[kShare];
+  return shares.isObject() ? shares : none;
 }
 
 void ChangeFlags(Json::Value& state, const std::string& share, int set, int clear) {

@@ -95,7 +95,12 @@ void GetShareNameByPath(std::string& share, const std::string& share_path) {
 }
 
 std::string GetFullPath(const std::string& share_path) {
-  const std::string share_dir = SDKShare(GetShareNameByPath(share_path)).GetPath();
+  OpenShares shares;
+  return GetFullPath(share_path, shares);
+}
+
+std::string GetFullPath(const std::string& share_path, OpenShares& shares) {
+  const std::string share_dir = shares.Get(GetShareNameByPath(share_path)).GetPath();
   return share_dir.substr(0, share_dir.rfind('/')) + share_path;
 }
 
@@ -139,12 +144,17 @@ bool IsSystemPreservedFileName(const std::string& name) {
 }
 
 PathVerdict JudgeFullPath(const std::string& full_path) {
+  OpenShares shares;
+  return JudgeFullPath(full_path, shares);
+}
+
+PathVerdict JudgeFullPath(const std::string& full_path, OpenShares& shares) {
   if (IsInSnapshot(full_path)) return {kPathInSnapshot};
   if (PathVerdict verdict = JudgeFileSystem(full_path); verdict.rule != kPathAccepted) return verdict;
   std::string name;
   std::string share_dir;
   GetShareNamePathByFullPath(name, share_dir, full_path);
-  const SDKShare share(name);
+  const SDKShare& share = shares.Get(name);
   if (!share.CanBeIndexed()) return {share.IsLocked() ? kPathShareLocked : kPathShareReadOnly, name};
   if (IsInRecycleBin(full_path, name)) return {kPathInRecycleBin};
   // Where an encrypted share is unlocked, its own directory is a mount point, and its files are to be indexed.
@@ -158,7 +168,12 @@ bool CanFullPathBeIndexed(const std::string& full_path) {
 }
 
 bool CanPathBeIndexed(const std::string& share_path) {
-  return CanFullPathBeIndexed(GetFullPath(share_path));
+  OpenShares shares;
+  return CanPathBeIndexed(share_path, shares);
+}
+
+bool CanPathBeIndexed(const std::string& share_path, OpenShares& shares) {
+  return JudgeFullPath(GetFullPath(share_path, shares), shares).rule == kPathAccepted;
 }
 
 }  // namespace quarrox::fileindex

@@ -1,14 +1,18 @@
 // Which paths belong to which share, which may be indexed, and what kind of file a name says it is.
 //
 // A full path is where a file lies on its volume (/volume1/docs/a). A share path is what users see: "/", the share's
-// name, and the rest (/docs/a). Paths are bytes; nothing here takes them for UTF-8. Thread-safe.
+// name, and the rest (/docs/a). Paths are bytes; nothing here takes them for UTF-8. Thread-safe. What takes OpenShares
+// is for an operation with many paths: it opens no share that is open there.
 #pragma once
 
 #include <string>
 
 #include "common/export.h"
+#include "common/sdk/open_shares.h"
 
 namespace quarrox::fileindex {
+
+using sdk::OpenShares;
 
 // The first component of a share path. Throws Error 120 with the path where it does not begin with "/".
 QUARROX_API std::string GetShareNameByPath(const std::string& share_path);
@@ -17,6 +21,7 @@ QUARROX_API void GetShareNameByPath(std::string& share, const std::string& share
 // The full path of a share path: the volume of the share, then the share path, so that a share's directory is taken to
 // bear the share's name. Throws Error 120 as GetShareNameByPath, Error 800 where there is no such share.
 QUARROX_API std::string GetFullPath(const std::string& share_path);
+QUARROX_API std::string GetFullPath(const std::string& share_path, OpenShares& shares);
 QUARROX_API void GetFullPath(std::string& full_path, const std::string& share_path);
 
 // The share that holds a full path, and that share's own directory. Throws Error 502 where no share does.
@@ -54,6 +59,7 @@ struct PathVerdict {
 // Judges a full path. Throws what finding its share throws: Error 502 where no share holds it, 800 where that is gone
 // meanwhile, 502 where the share cannot be asked.
 QUARROX_API PathVerdict JudgeFullPath(const std::string& full_path);
+QUARROX_API PathVerdict JudgeFullPath(const std::string& full_path, OpenShares& shares);
 
 // For people and programs: the rule's name in one word, why the path is refused, and what to do about it. All are empty
 // for an accepted path.
@@ -64,6 +70,7 @@ QUARROX_API std::string RemedyOf(const PathVerdict& verdict);
 // Whether JudgeFullPath accepts a path; throws as it does.
 QUARROX_API bool CanFullPathBeIndexed(const std::string& full_path);
 QUARROX_API bool CanPathBeIndexed(const std::string& share_path);
+QUARROX_API bool CanPathBeIndexed(const std::string& share_path, OpenShares& shares);
 
 // What a file is by its extension alone.
 enum FileType {

@@ -1,15 +1,124 @@
 #include "command.h"
 
 #include <charconv>
+#include <cstdint>
 #include <iterator>
 #include <system_error>
 
 namespace quarrox::ctl {
 
 namespace {
+
+constexpr size_t kAnyNumber = SIZE_MAX / 2;  // of operands; may be added to
+
 bool IsDigit(char c) {
   return '0' <= c && c <= '9';
 }
+
+const std::vector<Command> kCommands = {
+    {"folder",
+     "list",
+     "[--group GROUP] [--keyword TEXT] [--sort KEY] [--desc] [--offset N] [--limit N] [--json]",
+     "list the indexed folders; KEY is path, name, document, audio, video or photo",
+     {"--group=", "--keyword=", "--sort=", "--desc", "--offset=", "--limit=", "--json"},
+     0,
+     FolderList},
+    {"folder", "get", "[--json] PATH", "say all about one indexed folder", {"--json"}, 1, FolderGet},
+    {"folder", "groups", "[--json]", "list the groups of the indexed folders", {"--json"}, 0, FolderGroups},
+    {"folder",
+     "add",
+     "[--name NAME] [--types TYPE,...] [--group GROUP] [--owner USER] [--json] PATH...",
+     "index folders; TYPE is document, audio, video or photo, without --types all of them, or none alone",
+     {"--name=", "--types=", "--group=", "--owner=", "--json"},
+     1,
+     FolderAdd,
+     kAnyNumber},
+    {"folder",
+     "set",
+     "[--name NAME] [--types TYPE,...] [--group GROUP] [--owner USER] [--json] PATH",
+     "change an indexed folder; what is not named stays",
+     {"--name=", "--types=", "--group=", "--owner=", "--json"},
+     1,
+     FolderSet},
+    {"folder", "delete", "[--json] PATH...", "index folders no longer", {"--json"}, 1, FolderDelete, kAnyNumber},
+    {"folder", "reindex", "[--json] PATH...", "index again what is there", {"--json"}, 1, FolderReindex, kAnyNumber},
+    {"folder",
+     "summary",
+     "[--json]",
+     "say how far the index of each folder and group is",
+     {"--json"},
+     0,
+     FolderSummary},
+    {"queue",
+     "fold",
+     "[--summary] [--json] FILE",
+     "fold a queue file and print each operation that is left",
+     {"--summary", "--json"},
+     1,
+     QueueFold},
+    {"queue", "list", "[--json]", "list the queue of each share: its size and age", {"--json"}, 0, QueueList},
+    {"queue", "show", "[--json] SHARE", "print each operation that waits for a share", {"--json"}, 1, QueueShow},
+    {"pause", "", "[--json] [HOURS]", "pause indexing for HOURS or without end", {"--json"}, 0, Pause, 1},
+    {"resume", "", "[--json]", "end a pause", {"--json"}, 0, Resume},
+    {"search",
+     "",
+     "[--share SHARE] [--name] [--type EXTENSION,...] [--limit N] [--offset N] [--json] QUERY",
+     "find files by their words, or with --name by a part of their names; the best of them first",
+     {"--share=", "--name", "--type=", "--limit=", "--offset=", "--json"},
+     1,
+     Search},
+    {"share", "list", "[--json]", "list the shares and whether they can be indexed", {"--json"}, 0, ShareList},
+    {"share", "show", "[--json] NAME", "say all about one share", {"--json"}, 1, ShareShow},
+    {"share", "rename", "[--json] FROM TO", "follow a share that bears the new name TO", {"--json"}, 2, ShareRename},
+    {"share",
+     "migrate",
+     "[--json] NAME FROM TO",
+     "follow a share whose directory moved; FROM and TO are full paths",
+     {"--json"},
+     3,
+     ShareMigrate},
+    {"share", "pause", "[--json] NAME", "stop indexing in a share", {"--json"}, 1, SharePause},
+    {"share", "resume", "[--json] NAME", "index in a share again", {"--json"}, 1, ShareResume},
+    {"share", "rebuild", "[--json] NAME", "make the index of a share anew", {"--json"}, 1, ShareRebuild},
+    {"share",
+     "auto-clean",
+     "[--json] NAME",
+     "remove the index of a share; its folders stay",
+     {"--json"},
+     1,
+     ShareAutoClean},
+    {"share",
+     "clear-paused",
+     "[--json] NAME PATH",
+     "remove index and folders of a share that may be gone; PATH is its directory",
+     {"--json"},
+     2,
+     ShareClearPaused},
+    {"share",
+     "check-recycle",
+     "[--json] NAME",
+     "follow a share whose recycle bin was switched on or off",
+     {"--json"},
+     1,
+     ShareCheckRecycle},
+    {"suggest", "rebuild", "[--json]", "make missing term suggestions anew", {"--json"}, 0, SuggestRebuild},
+    {"explain",
+     "",
+     "[--json] PATH",
+     "say which share a path belongs to, and whether it is indexed or why not",
+     {"--json"},
+     1,
+     ExplainPath},
+    {"call",
+     "",
+     "OPERATION [JSON ...]",
+     "call an operation of the library, with a JSON text for each parameter; without operation: list them",
+     {"--json"},
+     0,
+     Call,
+     kAnyNumber},
+};
+
 }  // namespace
 
 Arguments::Arguments(const std::vector<std::string>& words, const std::set<std::string>& known_options) {
@@ -58,45 +167,7 @@ std::string NameOf(const Command& command) {
 }
 
 const std::vector<Command>& Commands() {
-  static const std::vector<Command> commands = {
-      {"folder",
-       "list",
-       "[--group GROUP] [--keyword TEXT] [--sort KEY] [--desc] [--offset N] [--limit N] [--json]",
-       "list the indexed folders; KEY is path, name, document, audio, video or photo",
-       {"--group=", "--keyword=", "--sort=", "--desc", "--offset=", "--limit=", "--json"},
-       0,
-       FolderList},
-      {"folder", "get", "[--json] PATH", "say all about one indexed folder", {"--json"}, 1, FolderGet},
-      {"folder", "groups", "[--json]", "list the groups of the indexed folders", {"--json"}, 0, FolderGroups},
-      {"queue",
-       "fold",
-       "[--summary] [--json] FILE",
-       "fold a queue file and print each operation that is left",
-       {"--summary", "--json"},
-       1,
-       QueueFold},
-      {"queue", "list", "[--json]", "list the queue of each share: its size and age", {"--json"}, 0, QueueList},
-      {"queue", "show", "[--json] SHARE", "print each operation that waits for a share", {"--json"}, 1, QueueShow},
-      {"pause", "", "[--json] [HOURS]", "pause indexing for HOURS or without end", {"--json"}, 0, Pause, 1},
-      {"resume", "", "[--json]", "end a pause", {"--json"}, 0, Resume},
-      {"search",
-       "",
-       "[--share SHARE] [--name] [--type EXTENSION,...] [--limit N] [--offset N] [--json] QUERY",
-       "find files by their words, or with --name by a part of their names; the best of them first",
-       {"--share=", "--name", "--type=", "--limit=", "--offset=", "--json"},
-       1,
-       Search},
-      {"share", "list", "[--json]", "list the shares and whether they can be indexed", {"--json"}, 0, ShareList},
-      {"share", "show", "[--json] NAME", "say all about one share", {"--json"}, 1, ShareShow},
-      {"explain",
-       "",
-       "[--json] PATH",
-       "say which share a path belongs to, and whether it is indexed or why not",
-       {"--json"},
-       1,
-       ExplainPath},
-  };
-  return commands;
+  return kCommands;
 }
 
 }  // namespace quarrox::ctl

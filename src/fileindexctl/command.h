@@ -59,17 +59,32 @@ std::string NameOf(const Command& command);
 // Every command, in the order of the help.
 const std::vector<Command>& Commands();
 
-int FolderList(const Arguments& arguments);
+int Call(const Arguments& arguments);
+int FolderAdd(const Arguments& arguments);
+int FolderDelete(const Arguments& arguments);
 int FolderGet(const Arguments& arguments);
 int FolderGroups(const Arguments& arguments);
+int FolderList(const Arguments& arguments);
+int FolderReindex(const Arguments& arguments);
+int FolderSet(const Arguments& arguments);
+int FolderSummary(const Arguments& arguments);
 int Pause(const Arguments& arguments);
 int QueueFold(const Arguments& arguments);
 int QueueList(const Arguments& arguments);
 int QueueShow(const Arguments& arguments);
 int Resume(const Arguments& arguments);
 int Search(const Arguments& arguments);
+int ShareAutoClean(const Arguments& arguments);
+int ShareCheckRecycle(const Arguments& arguments);
+int ShareClearPaused(const Arguments& arguments);
 int ShareList(const Arguments& arguments);
+int ShareMigrate(const Arguments& arguments);
+int SharePause(const Arguments& arguments);
+int ShareRebuild(const Arguments& arguments);
+int ShareRename(const Arguments& arguments);
+int ShareResume(const Arguments& arguments);
 int ShareShow(const Arguments& arguments);
+int SuggestRebuild(const Arguments& arguments);
 int ExplainPath(const Arguments& arguments);
 
 }  // namespace quarrox::ctl

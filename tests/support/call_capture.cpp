@@ -15,6 +15,7 @@ struct Calls {
   int flock_failures = 0;
   int flock_error = 0;
   time_t now = 0;  // 0 for the real time
+  std::function<void()> on_sleep = {};
   std::vector<useconds_t> sleeps = {};
   std::vector<int> flocks = {};
 };
@@ -35,6 +36,11 @@ void SetTime(time_t now) {
   calls.now = now;
 }
 
+void OnSleep(const std::function<void()>& action) {
+  const std::lock_guard<std::mutex> guard(lock);
+  calls.on_sleep = action;
+}
+
 std::vector<useconds_t> Sleeps() {
   const std::lock_guard<std::mutex> guard(lock);
   return calls.sleeps;
@@ -52,8 +58,13 @@ using namespace quarrox::support;
 extern "C" {
 
 int usleep(useconds_t microseconds) {
-  const std::lock_guard<std::mutex> guard(lock);
-  calls.sleeps.push_back(microseconds);
+  std::function<void()> action;
+  {
+    const std::lock_guard<std::mutex> guard(lock);
+    calls.sleeps.push_back(microseconds);
+    action.swap(calls.on_sleep);
+  }
+  if (action) action();
   return 0;
 }
 

@@ -6,6 +6,7 @@
 #include <unistd.h>
 
 #include <ctime>
+#include <functional>
 #include <vector>
 
 namespace quarrox::support {
@@ -16,6 +17,9 @@ void ResetCalls(int failures = 0, int error = 0);
 
 // Makes time() stand still.
 void SetTime(time_t now);
+
+// Does something once, in the next sleep.
+void OnSleep(const std::function<void()>& action);
 
 // What was asked for since: the microseconds of each sleep, and each flock(), real or failed, that did not unlock.
 std::vector<useconds_t> Sleeps();

@@ -12,12 +12,14 @@
 #include <utility>
 
 #include "common/error.h"
+#include "common/lock_file.h"
 #include "common/strings.h"
 
 namespace quarrox {
 namespace {
 
 constexpr size_t kReadSize = size_t{64} * 1024;
+constexpr int kAppendFlags = O_RDWR | O_APPEND | O_CREAT;
 
 [[noreturn]] void Fail(const std::string& path) {
   const int error = errno;
@@ -31,21 +33,26 @@ bool Lock(int fd, int operation) {
   return result == 0;
 }
 
+int Open(const std::string& path, int flags) {
+  return open(path.c_str(), flags | O_CLOEXEC, 0600);
+}
+
+bool IsStillAt(int fd, const std::string& path) {
+  struct stat mine;
+  struct stat there;
+  return fstat(fd, &mine) == 0 && stat(path.c_str(), &there) == 0 && mine.st_dev == there.st_dev &&
+         mine.st_ino == there.st_ino;
+}
+
 // An open queue file with its lock held; both go when it leaves scope. False and errno where that failed.
 class LockedQueue {
  public:
-  LockedQueue(const std::string& path, int flags) : fd_(open(path.c_str(), flags | O_CLOEXEC, 0600)) {
+  LockedQueue(const std::string& path, int flags) : fd_(Open(path, flags)) {
     if (fd_ && !Lock(fd(), LOCK_EX)) fd_ = UniqueFd();
   }
 
   explicit operator bool() const { return static_cast<bool>(fd_); }
   int fd() const { return fd_.get(); }
-  bool IsStillAt(const std::string& path) const {
-    struct stat mine;
-    struct stat there;
-    return fstat(fd(), &mine) == 0 && stat(path.c_str(), &there) == 0 && mine.st_dev == there.st_dev &&
-           mine.st_ino == there.st_ino;
-  }
 
  private:
   UniqueFd fd_;
@@ -97,10 +104,27 @@ bool RenameUnlessTaken(const std::string& path, const std::string& to) {
 
 void AppendToQueue(const std::string& path, const std::string& lines) {
   for (;;) {
-    const LockedQueue queue(path, O_RDWR | O_APPEND | O_CREAT);
+    const LockedQueue queue(path, kAppendFlags);
     if (!queue) Fail(path);
-    if (!queue.IsStillAt(path)) continue;
+    if (!IsStillAt(queue.fd(), path)) continue;
     Append(queue.fd(), path, lines);
+    return;
+  }
+}
+
+void AppendToQueueWithLockFile(const std::string& path, const std::string& lines) {
+  for (;;) {
+    // Opened first: a queue is made with its own mode, and what is still at the path with the lock held is what the
+    // lock file opened, too.
+    const UniqueFd fd(Open(path, kAppendFlags));
+    const int error = errno;
+    const LockFile lock(path, true);
+    if (!fd) {
+      errno = error;
+      Fail(path);
+    }
+    if (!IsStillAt(fd.get(), path)) continue;
+    Append(fd.get(), path, lines);
     return;
   }
 }
@@ -109,7 +133,7 @@ bool TakeQueue(const std::string& path, const std::string& to) {
   for (;;) {
     const LockedQueue queue(path, O_RDWR);
     if (!queue) return false;
-    if (queue.IsStillAt(path)) return RenameUnlessTaken(path, to);
+    if (IsStillAt(queue.fd(), path)) return RenameUnlessTaken(path, to);
   }
 }
 

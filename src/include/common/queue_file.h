@@ -23,6 +23,9 @@ namespace quarrox {
 // queue, path=PATH, reason=TEXT", which is not logged: whoever tries again says so once.
 QUARROX_API void AppendToQueue(const std::string& path, const std::string& lines);
 
+// The same with a LockFile as the lock, for who must not wait without end. Throws also what that throws.
+QUARROX_API void AppendToQueueWithLockFile(const std::string& path, const std::string& lines);
+
 // Renames the queue at `path` to `to`, waiting in the kernel for the lock. False with errno where that fails, both then
 // as they were: ENOENT where there is no queue, EEXIST where something is at `to` already.
 QUARROX_API bool TakeQueue(const std::string& path, const std::string& to);

@@ -17,7 +17,7 @@ SockConnection::~SockConnection() = default;
 DomainSockConnection::DomainSockConnection(const std::string& path) : path_(path) {}
 CALL(bool, DomainSockConnection::Connect, (long timeout), false, true, path_, std::to_string(timeout))
 CALL(bool, SockConnection::Send, (const std::string& text), false,
-     (FakePlatform::Get().engine_requests.push_back(text), true))
+     (FakePlatform::Get().engine_requests.push_back(text), true), text)
 CALL(bool, SockConnection::Recv, (std::string & text), false, Say(text))
 
 }  // namespace vexodaemon

@@ -66,7 +66,9 @@ Mutex& SDKMutex() {
 
 SDKShare::SDKShare(const std::string& share_name) : name_(share_name) {
   const LockMutex lock(SDKMutex());
-  if (0 > VEXOShareGet(share_name.c_str(), &share_info_) || share_info_ == nullptr) {
+  // A call would take a name with a zero byte for what is before it: another share.
+  const bool is_name = share_name.find('\0') == std::string::npos;
+  if (!is_name || 0 > VEXOShareGet(share_name.c_str(), &share_info_) || share_info_ == nullptr) {
     QUARROX_THROW("0 > VEXOShareGet(share_name.c_str(), &share_info_) || !share_info_", kErrNoSuchShare, share_name);
   }
 }

@@ -1,0 +1,50 @@
+// What the exported operations have in common. Nothing here takes the folder lock.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <unordered_map>
+#include <vector>
+
+#include "fileindex/custom_events.h"
+#include "fileindex/folder_mgr.h"
+
+namespace quarrox::fileindex {
+
+// The monitor configurations of several shares, made from one list: goes through the list once, when the first is
+// written, and opens each share once. What changes in the list afterwards is not seen.
+class MonitorConfigs {
+ public:
+  // Both must outlive this object.
+  MonitorConfigs(const FolderMgr& folder_mgr, OpenShares& shares) : folder_mgr_(folder_mgr), shares_(shares) {}
+
+  // As UpsertVEXONotifydCfg and DeleteVEXONotifydCfg.
+  void Upsert(const std::string& share_name);
+  void Delete(const std::string& share_name);
+
+ private:
+  const std::vector<std::shared_ptr<Folder>>& FoldersOf(const std::string& share_name);
+
+  const FolderMgr& folder_mgr_;
+  OpenShares& shares_;
+  bool grouped_ = false;
+  std::unordered_map<std::string, std::vector<std::shared_ptr<Folder>>> folders_;  // by share
+};
+
+// Switches on or off what indexing needs of the machine: the SMB service's search, content extraction (never off) and
+// the indexing daemon. Failures are logged and not thrown.
+void SetupRelatedServices(bool enable);
+
+// Removes the queue and the database of the share with the directory `share_path`, a full path, and forgets its status
+// flags. The share need not exist. Throws Error 502 where its places cannot be told from its path, and what changing
+// the status throws; a file that cannot be removed stays.
+void CleanShareIndexData(const std::string& share_name, const std::string& share_path);
+
+// What pausing and resuming of a share does outside the folder list.
+void PauseShare(const std::string& share_name, MonitorConfigs& monitors);
+void ResumeShare(const std::string& share_name, MonitorConfigs& monitors);
+
+// GetIndexProcessingStatus for a list that is loaded already.
+std::string IndexProcessingStatusOf(const FolderMgr& folder_mgr, OpenShares& shares);
+
+}  // namespace quarrox::fileindex
