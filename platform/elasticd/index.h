@@ -42,7 +42,7 @@ class Index {
   // The documents and bytes of text that are taken before they go to disk by themselves. Larger portions take more
   // memory and, because that memory is then no longer in the processor's cache, more time (bench/search_bench.cpp).
   static constexpr size_t kPortionDocuments = 1000;
-  static constexpr size_t kPortionBytes = size_t{8} << 20;
+  static constexpr size_t kPortionBytes = size_t{16} << 20;
 
   Index(const std::string& path, const Json::Value& mappings, bool paused);
   ~Index();
