@@ -8,19 +8,17 @@
 #include <cstdio>
 #include <cstring>
 #include <memory>
+#include <vector>
+
+#include <systemd/sd-daemon.h>
 
 #include "common/error.h"
-#include "common/log.h"
 #include "common/unique_fd.h"
-#include "queue_writer.h"
+#include "monitor_service.h"
 #include "scope.h"
-#include "watcher.h"
 
 namespace quarrox::notifyd {
 namespace {
-
-// One round takes what was reported by then; further ones what that left open, such as the missing half of a move.
-constexpr int kLastRounds = 3;
 
 UniqueFd CatchStopSignals() {
   sigset_t signals;
@@ -33,60 +31,44 @@ UniqueFd CatchStopSignals() {
   return fd;
 }
 
-std::unique_ptr<Watcher> MakeWatcher(const Options& options, const Scope& scope, EventSink& sink) {
-  if (options.method == Method::kInotify) return MakeInotifyWatcher(scope, sink);
-  std::string why;
-  auto watcher = MakeFanotifyWatcher(scope, sink, options.limited_queue, why);
-  if (watcher != nullptr) return watcher;
-  const std::string text = "fanotify cannot watch " + scope.dir() + ": " + why;
-  if (options.method == Method::kFanotify) throw Error(kErrSystem, text + "; run as root, or use --method inotify");
-  QUARROX_LOG_PROGRESS("%s; inotify is used", log::Text(text).c_str());
-  return MakeInotifyWatcher(scope, sink);
-}
-
-int Earlier(int a, int b) {
-  if (a < 0 || b < 0) return a < 0 ? b : a;
-  return a < b ? a : b;
+// One directory and one queue, as given on the command line.
+std::unique_ptr<MonitorService> WatchOne(const Options& options) {
+  const std::string dir = Scope(options.dir, options.queue).dir();
+  const Monitor monitor{RealQueue(options.queue), {{dir, kAllEvents, {std::string(kMetadataDir)}}}};
+  auto service = std::make_unique<MonitorService>(options, monitor);
+  fprintf(stderr, "watching %s with %s, queue %s\n", dir.c_str(), service->watches().MethodOf(dir).c_str(),
+          monitor.queue.c_str());
+  return service;
 }
 
 // False when a stop signal came.
-bool RunOnce(Watcher& watcher, QueueWriter& writer, int signals) {
-  pollfd fds[] = {{signals, POLLIN, 0}, {watcher.fd(), POLLIN, 0}};
-  const int watcher_timeout = watcher.Timeout();
-  const int ready = poll(fds, 2, Earlier(watcher_timeout, writer.Timeout()));
+bool RunOnce(MonitorService& service, int signals) {
+  std::vector<pollfd> fds = {{signals, POLLIN, 0}};
+  service.AddPollFds(fds);
+  const int ready = poll(fds.data(), fds.size(), service.Timeout());
   if (ready < 0 && errno != EINTR) throw Error(kErrSystem, std::string("poll failed, reason=") + strerror(errno));
+  if (ready < 0) return true;
   if (fds[0].revents != 0) return false;
-  if (fds[1].revents != 0 || (ready == 0 && watcher_timeout >= 0)) watcher.Drain();
-  writer.Flush();
+  service.Process(fds.data() + 1, ready == 0);
   return true;
-}
-
-void WriteRest(Watcher& watcher, QueueWriter& writer, const std::string& queue) {
-  for (int round = 0; round < kLastRounds; ++round) watcher.Drain();
-  if (!writer.FlushNow())
-    throw Error(kErrSystem, "Events are lost because the queue cannot be written, queue=" + queue);
-}
-
-void Run(Watcher& watcher, QueueWriter& writer, int signals, const std::string& queue) {
-  try {
-    while (RunOnce(watcher, writer, signals)) {
-    }
-    WriteRest(watcher, writer, queue);
-  } catch (const Error&) {
-    writer.FlushNow();
-    throw;
-  }
 }
 
 }  // namespace
 
 void RunDaemon(const Options& options) {
   const UniqueFd signals = CatchStopSignals();
-  const Scope scope(options.dir, options.queue);
-  QueueWriter writer(scope.queue(), scope.dir());
-  const std::unique_ptr<Watcher> watcher = MakeWatcher(options, scope, writer);
-  fprintf(stderr, "watching %s with %s, queue %s\n", scope.dir().c_str(), watcher->method(), scope.queue().c_str());
-  Run(*watcher, writer, signals.get(), scope.queue());
+  const auto service =
+      options.dir.empty() ? std::make_unique<MonitorService>(options, kMonitorDirectory) : WatchOne(options);
+  sd_notify(0, "READY=1");
+  try {
+    while (RunOnce(*service, signals.get())) {
+    }
+  } catch (const Error&) {
+    service->FlushNow();
+    throw;
+  }
+  sd_notify(0, "STOPPING=1");
+  service->Finish();
 }
 
 }  // namespace quarrox::notifyd

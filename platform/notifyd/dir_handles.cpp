@@ -31,6 +31,10 @@ int OpenHandle(int mount, const std::string& key) {
   return open_by_handle_at(mount, &buffer.handle, O_PATH | O_CLOEXEC | O_DIRECTORY);
 }
 
+std::string DescriptorPath(int fd) {
+  return "/proc/self/fd/" + std::to_string(fd);
+}
+
 // A deleted directory's path ends in kDeletedSuffix; so may a living one's, which then leads to that directory.
 bool IsDeleted(int fd, const std::string& path) {
   if (!path.ends_with(kDeletedSuffix)) return false;
@@ -41,7 +45,7 @@ bool IsDeleted(int fd, const std::string& path) {
 }
 
 bool ReadPath(int fd, std::string& path) {
-  const std::string link = "/proc/self/fd/" + std::to_string(fd);
+  const std::string link = DescriptorPath(fd);
   char buffer[PATH_MAX];
   const ssize_t size = readlink(link.c_str(), buffer, sizeof(buffer));
   if (size < 0) return false;
@@ -51,30 +55,52 @@ bool ReadPath(int fd, std::string& path) {
 
 }  // namespace
 
-DirHandles::DirHandles(const std::string& dir)
-    : mount_(open(dir.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)), dir_(dir) {
-  if (!mount_) {
-    const std::string why = strerror(errno);
-    throw Error(kErrSystem, "The directory to watch cannot be opened, path=" + dir + ", reason=" + why);
-  }
+DirHandles::DirHandles(const std::string& dir) : dir_(dir) {
+  if (OpenMount() && Identify(dir, identity_)) return;
+  const std::string why = strerror(errno);
+  throw Error(kErrSystem, "The directory to watch cannot be opened, path=" + dir + ", reason=" + why);
 }
 
-bool DirHandles::Works() const {
+bool DirHandles::OpenMount() {
+  mount_ = UniqueFd(open(dir_.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  return static_cast<bool>(mount_);
+}
+
+// A descriptor of the mount; negative where the mount is gone, errno then says that the handles mean nothing any more.
+int DirHandles::Mount() {
+  if (mount_) return mount_.get();
+  Identity now;
+  const bool same = OpenMount() && Identify(DescriptorPath(mount_.get()), now) && now.mount == identity_.mount &&
+                    now.device == identity_.device;
+  if (same || (!mount_ && errno != ENOENT && errno != ENOTDIR)) return mount_.get();
+  mount_ = UniqueFd();
+  return errno = ESTALE, -1;
+}
+
+bool DirHandles::Works() {
   HandleBuffer buffer = {};
   buffer.handle.handle_bytes = MAX_HANDLE_SZ;
   int mount_id = 0;
-  if (name_to_handle_at(mount_.get(), "", &buffer.handle, &mount_id, AT_EMPTY_PATH) != 0) return false;
-  return static_cast<bool>(UniqueFd(open_by_handle_at(mount_.get(), &buffer.handle, O_PATH | O_CLOEXEC | O_DIRECTORY)));
+  const int mount = Mount();
+  if (name_to_handle_at(mount, "", &buffer.handle, &mount_id, AT_EMPTY_PATH) != 0) return false;
+  return static_cast<bool>(UniqueFd(open_by_handle_at(mount, &buffer.handle, O_PATH | O_CLOEXEC | O_DIRECTORY)));
+}
+
+void DirHandles::Clear() {
+  open_.clear();
+  mount_ = UniqueFd();
 }
 
 int DirHandles::Open(const std::string& handle) {
   const auto found = open_.find(handle);
   if (found != open_.end()) return found->second.get();
   if (open_.size() >= kMaxOpen) open_.clear();
-  int fd = OpenHandle(mount_.get(), handle);
+  const int mount = Mount();
+  if (mount < 0) return -1;
+  int fd = OpenHandle(mount, handle);
   if (fd < 0 && (errno == EMFILE || errno == ENFILE || errno == ENOMEM)) {
     open_.clear();
-    fd = OpenHandle(mount_.get(), handle);
+    fd = OpenHandle(mount, handle);
   }
   if (fd >= 0) open_.emplace(handle, UniqueFd(fd));
   return fd;

@@ -8,6 +8,7 @@
 #include <unordered_map>
 
 #include "common/unique_fd.h"
+#include "identity.h"
 
 namespace quarrox::notifyd {
 
@@ -21,11 +22,11 @@ class DirHandles {
     kFailed,  // it could not be told, because of a lack of memory or descriptors or a broken disk
   };
 
-  // `dir` lies on the file system whose handles these are. Throws Error 502 where it cannot be opened.
+  // `dir` is on the mount whose handles these are. Throws Error 502 where it cannot be opened.
   explicit DirHandles(const std::string& dir);
 
   // Whether this process may open directories by handle here; errno says why not.
-  bool Works() const;
+  bool Works();
 
   // The present path of the directory with this handle: bytes of handle_type, then of f_handle.
   State Locate(const std::string& handle, std::string& path);
@@ -33,13 +34,17 @@ class DirHandles {
   // A descriptor (O_PATH) of the directory, valid until the next call; negative, errno set, where there is none.
   int Open(const std::string& handle);
 
-  // Closes the kept directories, so that they hold no mount busy.
-  void Clear() { open_.clear(); }
-  bool empty() const { return open_.empty(); }
+  // Closes everything, so that nothing holds the mount busy, until it is needed again.
+  void Clear();
+  bool empty() const { return open_.empty() && !mount_; }
 
  private:
+  int Mount();
+  bool OpenMount();
+
   UniqueFd mount_;
   std::string dir_;
+  Identity identity_;
   std::unordered_map<std::string, UniqueFd> open_;
   bool too_long_logged_ = false;
 };

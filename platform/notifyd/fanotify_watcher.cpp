@@ -17,7 +17,7 @@ constexpr uint64_t kMask = FAN_CREATE | FAN_DELETE | FAN_ATTRIB | FAN_CLOSE_WRIT
 constexpr unsigned kFlags = FAN_CLASS_NOTIF | FAN_REPORT_DFID_NAME | FAN_NONBLOCK | FAN_CLOEXEC;
 constexpr size_t kReadSize = size_t{256} << 10;
 constexpr size_t kMaxBatch = size_t{64} << 20;
-constexpr int kIdleMs = 1000;
+constexpr int kIdleMs = 100;    // directories that are kept open hold their mount busy
 constexpr int kMaxRounds = 16;  // before the caller may look at its other concerns
 
 // A directory's handle and a name in it, both in the buffer that was read.
@@ -95,15 +95,35 @@ void AddEvents(EventBatch& batch, const char* event, const char* end) {
   }
 }
 
+int Mark(int fd, const std::string& dir) {
+  return fanotify_mark(fd, FAN_MARK_ADD | FAN_MARK_FILESYSTEM, kMask, AT_FDCWD, dir.c_str());
+}
+
 class FanotifyWatcher final : public Watcher {
  public:
   FanotifyWatcher(const Scope& scope, EventSink& sink, UniqueFd fd)
-      : fd_(std::move(fd)), handles_(scope.dir()), resolver_(scope, handles_, sink), buffer_(kReadSize) {}
+      : scope_(scope),
+        fd_(std::move(fd)),
+        handles_(scope.dir()),
+        resolver_(scope, handles_, sink),
+        buffer_(kReadSize) {}
 
   const char* method() const override { return "fanotify"; }
   int fd() const override { return fd_.get(); }
   int Timeout() const override { return handles_.empty() ? -1 : kIdleMs; }
-  bool CanResolve() const { return handles_.Works(); }
+
+  bool CanResolve() {
+    const bool works = handles_.Works();
+    handles_.Clear();
+    return works;
+  }
+
+  // The kernel takes a mark that is there already once more.
+  void Renew() override {
+    if (Mark(fd_.get(), scope_.dir()) == 0) return;
+    const std::string why = strerror(errno);
+    throw Error(kErrSystem, "fanotify cannot watch " + scope_.dir() + " any more, reason=" + why);
+  }
 
   void Drain() override {
     if (!ResolveOne()) return handles_.Clear();
@@ -134,6 +154,7 @@ class FanotifyWatcher final : public Watcher {
     throw Error(kErrSystem, std::string("Reading fanotify events failed, reason=") + strerror(errno));
   }
 
+  const Scope& scope_;
   UniqueFd fd_;
   DirHandles handles_;
   Resolver resolver_;
@@ -175,9 +196,7 @@ UniqueFd OpenFanotify(bool limited) {
 std::unique_ptr<Watcher> MakeFanotifyWatcher(const Scope& scope, EventSink& sink, bool limited, std::string& why) {
   UniqueFd fd = OpenFanotify(limited);
   if (!fd) return Unavailable("fanotify_init", why);
-  if (fanotify_mark(fd.get(), FAN_MARK_ADD | FAN_MARK_FILESYSTEM, kMask, AT_FDCWD, scope.dir().c_str()) != 0) {
-    return Unavailable("fanotify_mark", why);
-  }
+  if (Mark(fd.get(), scope.dir()) != 0) return Unavailable("fanotify_mark", why);
   auto watcher = std::make_unique<FanotifyWatcher>(scope, sink, std::move(fd));
   if (!watcher->CanResolve()) return Unavailable("open_by_handle_at", why);
   return watcher;

@@ -106,7 +106,7 @@ void InotifyWatcher::HandleDirectory(const inotify_event& event) {
   }
   if ((event.mask & IN_ATTRIB) != 0 && LookAt(scope_.dir())) Write(kAttributes, true, scope_.dir());
   if ((event.mask & (IN_DELETE_SELF | IN_MOVE_SELF | IN_UNMOUNT)) == 0) return;
-  Write(kDeleted, true, scope_.dir());
+  if ((event.mask & IN_UNMOUNT) == 0) Write(kDeleted, true, scope_.dir());
   throw Error(kErrSystem, "The watched directory was deleted, moved or unmounted, path=" + scope_.dir());
 }
 

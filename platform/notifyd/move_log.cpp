@@ -3,24 +3,6 @@
 #include <algorithm>
 
 namespace quarrox::notifyd {
-namespace {
-
-// Up one directory; empty above the topmost.
-std::string_view Parent(std::string_view path) {
-  const size_t slash = path.rfind('/');
-  return slash == std::string_view::npos ? std::string_view() : path.substr(0, slash);
-}
-
-}  // namespace
-
-bool IsCovered(const PathSet& dirs, std::string_view path) {
-  if (dirs.empty()) return false;
-  for (; !path.empty(); path = Parent(path)) {
-    if (dirs.contains(path)) return true;
-  }
-  return false;
-}
-
 void MoveLog::Clear() {
   ends_.clear();
   targets_.clear();

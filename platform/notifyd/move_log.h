@@ -5,20 +5,12 @@
 #include <string>
 #include <string_view>
 #include <unordered_map>
-#include <unordered_set>
 #include <utility>
 #include <vector>
 
+#include "paths.h"
+
 namespace quarrox::notifyd {
-
-struct PathHash {
-  using is_transparent = void;
-  size_t operator()(std::string_view path) const { return std::hash<std::string_view>()(path); }
-};
-using PathSet = std::unordered_set<std::string, PathHash, std::equal_to<>>;
-
-// Whether `path` is one of `dirs` or below one.
-bool IsCovered(const PathSet& dirs, std::string_view path);
 
 class MoveLog {
  public:

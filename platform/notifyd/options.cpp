@@ -5,12 +5,16 @@
 namespace quarrox::notifyd {
 namespace {
 
-enum Option { kWatch = 1, kQueue, kMethod, kLimited, kHelp };
+enum Option { kWatch = 1, kQueue, kMethod, kLimited, kForeground, kHelp };
 
 constexpr option kOptions[] = {
-    {"watch", required_argument, nullptr, kWatch},   {"queue", required_argument, nullptr, kQueue},
-    {"method", required_argument, nullptr, kMethod}, {"limited-queue", no_argument, nullptr, kLimited},
-    {"help", no_argument, nullptr, kHelp},           {nullptr, 0, nullptr, 0},
+    {"watch", required_argument, nullptr, kWatch},
+    {"queue", required_argument, nullptr, kQueue},
+    {"method", required_argument, nullptr, kMethod},
+    {"limited-queue", no_argument, nullptr, kLimited},
+    {"foreground", no_argument, nullptr, kForeground},
+    {"help", no_argument, nullptr, kHelp},
+    {nullptr, 0, nullptr, 0},
 };
 
 Method ParseMethod(const std::string& name) {
@@ -34,6 +38,9 @@ void Apply(Options& options, int option) {
     case kLimited:
       options.limited_queue = true;
       break;
+    case kForeground:
+      options.foreground = true;
+      break;
     case kHelp:
       options.help = true;
       break;
@@ -45,14 +52,19 @@ void Apply(Options& options, int option) {
 }  // namespace
 
 const char* const kUsage =
-    "Usage: vexonotifyd --watch DIR --queue FILE [--method METHOD] [--limited-queue]\n"
+    "Usage: vexonotifyd [--foreground] [--method METHOD] [--limited-queue]\n"
+    "       vexonotifyd --watch DIR --queue FILE [--foreground] [--method METHOD] [--limited-queue]\n"
     "\n"
-    "Writes what happens in DIR and everything below it to the event queue FILE, one line an event, until SIGTERM.\n"
+    "Writes what happens in folders and everything below them to event queues, one line an event, until SIGTERM: by "
+    "the\n"
+    "configurations /var/lib/vexonotifyd/*.json, which are followed as they come, change and go, or for one folder.\n"
+    "It never leaves the foreground.\n"
     "\n"
-    "  --watch DIR       the directory to watch; what is mounted below it is watched with inotify only\n"
-    "  --queue FILE      the queue to append to; it may lie inside DIR\n"
+    "  --watch DIR       watch this directory; what is mounted below it is watched with inotify only\n"
+    "  --queue FILE      its queue, to append to; it may lie inside DIR\n"
     "  --method METHOD   fanotify (needs root), inotify (one watch a directory), or auto: the first that is\n"
     "                    permitted here (default)\n"
+    "  --foreground      write the log to standard error, too\n"
     "  --limited-queue   let the kernel drop events past its limit, which is then reported as a loss\n"
     "  --help            show this text\n";
 
@@ -63,8 +75,8 @@ Options ParseOptions(int argc, char** argv) {
   for (int option; (option = getopt_long(argc, argv, "", kOptions, nullptr)) != -1;) Apply(options, option);
   if (options.help) return options;
   if (optind < argc) throw UsageError(std::string("'") + argv[optind] + "' is not expected");
-  if (options.dir.empty()) throw UsageError("--watch DIR is missing");
-  if (options.queue.empty()) throw UsageError("--queue FILE is missing");
+  if (options.dir.empty() && !options.queue.empty()) throw UsageError("--watch DIR is missing");
+  if (!options.dir.empty() && options.queue.empty()) throw UsageError("--queue FILE is missing");
   return options;
 }
 

@@ -9,10 +9,11 @@ namespace quarrox::notifyd {
 enum class Method { kAuto, kFanotify, kInotify };
 
 struct Options {
-  std::string dir;
+  std::string dir;  // empty to serve the monitor configurations
   std::string queue;
   Method method = Method::kAuto;
   bool limited_queue = false;
+  bool foreground = false;
   bool help = false;
 };
 

@@ -69,11 +69,6 @@ bool QueueWriter::FlushNow() {
   return WriteBatches();
 }
 
-void QueueWriter::GiveUp() {
-  Drop();
-  WriteLost();
-}
-
 int QueueWriter::Timeout() const {
   if (pending_.empty() && !dropped_) return -1;
   const auto left = std::chrono::ceil<std::chrono::milliseconds>(retry_ - Clock::now());

@@ -18,8 +18,11 @@ class QueueWriter final : public EventSink {
   static constexpr size_t kMaxPending = size_t{64} << 20;
   using Clock = std::chrono::steady_clock;
 
-  // `root` is the path that a line about lost events carries.
-  QueueWriter(std::string queue, std::string root) : queue_(std::move(queue)), root_(std::move(root)) {}
+  explicit QueueWriter(std::string queue) : queue_(std::move(queue)) {}
+
+  // The path that a line about lost events carries.
+  void set_root(const std::string& root) { root_ = root; }
+  const std::string& root() const { return root_; }
 
   // Keeps the event's line; writes once a batch is full.
   void Add(const Event& event) override;
@@ -29,9 +32,6 @@ class QueueWriter final : public EventSink {
 
   // The same, however short ago writing failed.
   bool FlushNow();
-
-  // Drops what waits, and tries to write the one line that says so: it may fit where the rest does not.
-  void GiveUp();
 
   // Milliseconds until Flush() should be called again, -1 when nothing waits.
   int Timeout() const;
@@ -43,7 +43,7 @@ class QueueWriter final : public EventSink {
   void Drop();
 
   const std::string queue_;
-  const std::string root_;
+  std::string root_;
   std::string pending_;
   bool failing_ = false;
   bool dropped_ = false;  // lines were dropped and the reader does not know yet

@@ -29,50 +29,30 @@ std::string DirectoryOf(const std::string& path) {
   return dir.empty() ? "/" : dir;
 }
 
-bool HasMetadataComponent(std::string_view relative) {
-  while (!relative.empty()) {
-    const size_t slash = relative.find('/');
-    if (relative.substr(0, slash) == kMetadataDir) return true;
-    if (slash == std::string_view::npos) return false;
-    relative.remove_prefix(slash + 1);
-  }
-  return false;
-}
-
 }  // namespace
 
-std::string Join(std::string_view dir, std::string_view name) {
-  std::string path;
-  path.reserve(dir.size() + name.size() + 1);
-  path += dir;
-  if (name == ".") return path;
-  if (!path.ends_with('/')) path += '/';
-  path += name;
+Scope::Scope(const std::string& dir, const std::string& queue) : dir_(RealDirectory(dir, "The directory to watch")) {
+  auto routes = std::make_shared<Routes>();
+  routes->Add({dir_, dir_, watch_, kAllEvents, {std::string(kMetadataDir)}, nullptr});
+  routes->AddQueue(RealQueue(queue));
+  routes_ = std::move(routes);
+}
+
+std::string RealQueue(const std::string& path) {
+  const std::string dir = RealDirectory(DirectoryOf(path), "The queue's directory");
+  const std::string name = Basename(path);
+  if (name.empty()) throw Error(kErrSystem, "The queue is no file name, path=" + path);
+  return Join(dir, name);
+}
+
+std::string RealPath(const std::string& path) {
+  char real[PATH_MAX];
+  for (std::string_view there = path; !there.empty(); there = Parent(there)) {
+    if (realpath(std::string(there).c_str(), real) == nullptr) continue;
+    const std::string_view rest = std::string_view(path).substr(there.size());
+    return rest.empty() ? real : std::string(Climbable(real)) + std::string(rest);
+  }
   return path;
-}
-
-Scope::Scope(const std::string& dir, const std::string& queue)
-    : dir_(RealDirectory(dir, "The directory to watch")),
-      parent_(dir_ == "/" ? std::string() : DirectoryOf(dir_)),
-      queue_dir_(RealDirectory(DirectoryOf(queue), "The queue's directory")),
-      queue_name_(Basename(queue)) {
-  if (queue_name_.empty()) throw Error(kErrSystem, "The queue is no file name, path=" + queue);
-  queue_ = Join(queue_dir_, queue_name_);
-}
-
-bool Scope::IsInside(std::string_view dir) const {
-  if (!dir.starts_with(dir_)) return false;
-  std::string_view rest = dir.substr(dir_.size());
-  if (rest.empty() || dir_ == "/") return !HasMetadataComponent(rest);
-  return rest.front() == '/' && !HasMetadataComponent(rest.substr(1));
-}
-
-bool Scope::IsInside(std::string_view dir, std::string_view name) const {
-  if (!IsInside(dir)) return dir == parent_ && Join(dir, name) == dir_;
-  if (name == kMetadataDir) return false;
-  if (dir != queue_dir_ || !name.starts_with(queue_name_)) return true;
-  const std::string_view rest = name.substr(queue_name_.size());
-  return !rest.empty() && rest != ".tmp";
 }
 
 }  // namespace quarrox::notifyd

@@ -1,6 +1,6 @@
 // The two ways of hearing what happens in a tree.
 //
-// fanotify marks the file system once, whatever the tree's size; what is mounted below the watched directory is another
+// fanotify marks the file system of the scope's directory once, whatever its size; what is mounted below is another
 // file system and is not heard. inotify, where fanotify is not permitted, needs one watch a directory. Not thread-safe.
 #pragma once
 
@@ -28,9 +28,14 @@ class Watcher {
 
   // Milliseconds after which Drain() wants to be called although nothing was reported, -1 for never.
   virtual int Timeout() const = 0;
+
+  // To be called when something may have been unmounted and mounted again where the scope's directory is. What is
+  // there now is heard afterwards. Throws Error 502.
+  virtual void Renew() {}
 };
 
-// Scope and sink stay the caller's and must outlive the watcher. Everything that happens after the return is heard.
+// Scope and sink stay the caller's and must outlive the watcher. Everything that happens after the return is heard. The
+// scope may follow other routes between two calls, where its folders stay those that a watcher of inotify was made for.
 
 // `limited` leaves the length of the kernel's queue limited. Null, with `why` filled, where fanotify is not permitted
 // or not supported here; throws Error 502 on any other failure.

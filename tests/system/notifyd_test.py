@@ -382,7 +382,7 @@ class CommandLineTest(unittest.TestCase):
     def test_bad_usage_is_2_and_failure_is_1(self):
         with tempfile.TemporaryDirectory() as here:
             missing = here + "/missing"
-            for code, *args in ((2,), (2, "--watch", here), (2, "--watch", here, "--queue", "q", "--method", "x"),
+            for code, *args in ((2, "--queue", "q"), (2, "--watch", here), (2, "--watch", here, "--queue", "q", "--method", "x"),
                                 (1, "--watch", missing, "--queue", here + "/q"), (1, "--watch", here, "--queue", missing + "/q")):
                 done = subprocess.run([DAEMON, *args], stderr=subprocess.PIPE, text=True, timeout=DEADLINE)
                 self.assertEqual(done.returncode, code, args)
