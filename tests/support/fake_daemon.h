@@ -44,7 +44,7 @@ class FakeDaemon {
       recv(fd, &length, sizeof(length), MSG_WAITALL);
       std::string text(length, '\0');
       recv(fd, text.data(), length, MSG_WAITALL);
-      FakePlatform::Get().Begin("Daemon", {text.c_str()});
+      FakePlatform::Get().Begin("Daemon", {text.substr(0, length - 1)});  // without the zero
       send(fd, &length, sizeof(length), MSG_NOSIGNAL);
       send(fd, text.data(), length, MSG_NOSIGNAL);
     }
