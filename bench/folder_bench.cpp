@@ -5,7 +5,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <chrono>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -17,23 +16,19 @@
 #include <vector>
 
 #include "fileindex/folder_mgr.h"
+#include "measure.h"
 #include "support/private_machine.h"
 
 namespace {
 
 using namespace quarrox;
+using bench::Seconds;
 using fileindex::Folder;
 using fileindex::FolderMgr;
 
 constexpr int kRounds = 7;
 constexpr size_t kShares = 10;
 constexpr size_t kPaths = 1000;  // asked one after another, so that no single one stays in the processor's cache
-
-double Seconds(const std::function<void()>& work) {
-  const auto start = std::chrono::steady_clock::now();
-  work();
-  return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
-}
 
 // Nanoseconds a path, the least of some rounds: what else runs here only adds.
 double Nanoseconds(const std::vector<std::string>& paths, const std::function<void(const std::string&)>& ask) {

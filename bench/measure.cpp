@@ -33,9 +33,7 @@ Cost RunHere(const std::function<void()>& work) {
   Cost cost;
   const double resident = StatusBytes("VmRSS:");
   const double cpu = CpuSeconds();
-  const auto start = std::chrono::steady_clock::now();
-  work();
-  cost.wall_seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+  cost.wall_seconds = Seconds(work);
   cost.cpu_seconds = CpuSeconds() - cpu;
   cost.peak_bytes = StatusBytes("VmHWM:") - resident;
   return cost;
@@ -66,6 +64,12 @@ Cost RunInChild(const std::function<void()>& work) {
 }
 
 }  // namespace
+
+double Seconds(const std::function<void()>& work) {
+  const auto start = std::chrono::steady_clock::now();
+  work();
+  return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+}
 
 Cost Measure(const std::function<void()>& work, int runs, double Cost::*median_of) {
   std::vector<Cost> costs;

@@ -15,4 +15,7 @@ struct Cost {
 // fails ends the program.
 Cost Measure(const std::function<void()>& work, int runs = 3, double Cost::*median_of = &Cost::cpu_seconds);
 
+// How long a piece of work takes, by the wall.
+double Seconds(const std::function<void()>& work);
+
 }  // namespace quarrox::bench

@@ -6,7 +6,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <chrono>
 #include <cstdint>
 #include <cstdio>
 #include <cstdlib>
@@ -22,6 +21,7 @@
 #include "fileindex/communication.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/index_mgr.h"
+#include "measure.h"
 #include "support/private_machine.h"
 
 namespace {
@@ -34,9 +34,7 @@ constexpr size_t kShares = 10;
 constexpr int kRounds = 3;
 
 double Milliseconds(const std::function<void()>& work) {
-  const auto start = std::chrono::steady_clock::now();
-  work();
-  return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count() * 1e3;
+  return bench::Seconds(work) * 1e3;
 }
 
 // The least of some rounds: what else runs here only adds.

@@ -107,10 +107,9 @@ Connection* ConnectionTable::Own(Connection& connection) {
   return &connection;
 }
 
-// The caller has one of them.
-bool ConnectionTable::IsOnly(const Connection&) const {
+bool ConnectionTable::HasSeveral() const {
   const std::lock_guard lock(mutex_);
-  return count_ <= 1 + static_cast<size_t>(leaving_);
+  return count_ > 1 + static_cast<size_t>(leaving_);
 }
 
 Connection* ConnectionTable::Take(uint64_t token) {

@@ -60,8 +60,8 @@ class ConnectionTable {
   // Whether the connection may take this much memory. Else it has been handed back and waits for that.
   bool Reserve(Connection& connection, size_t memory);
 
-  // Whether nobody else is connected, save those who are expected to go.
-  bool IsOnly(const Connection& connection) const;
+  // Whether more than one is connected, save those who are expected to go.
+  bool HasSeveral() const;
   void ExpectToGo(bool expected) { leaving_ += expected ? 1 : -1; }
 
   // A request is to be carried out: its time to arrive is over.

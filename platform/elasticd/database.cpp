@@ -227,8 +227,6 @@ Xapian::Query Convert(const Query& query) {
       return Combine(Query::OP_AND_NOT, query, Query::OP_OR);
     case elasticd::Query::kAndPerhaps:
       return Combine(Query::OP_AND_MAYBE, query, Query::OP_OR);
-    case elasticd::Query::kFilter:
-      return Combine(Query::OP_FILTER, query, Query::OP_AND);
   }
   return Query::MatchNothing;
 }
@@ -309,8 +307,8 @@ DocumentId Writer::NextId() const {
   return Guard([&] { return impl_->database.get_lastdocid() + 1; });
 }
 
-DocumentId Writer::Add(const AnalyzedDocument& content, const std::string& place) {
-  return Guard([&] { return impl_->database.add_document(MakeDocument(content, place)); });
+void Writer::Add(const AnalyzedDocument& content, const std::string& place) {
+  Guard([&] { impl_->database.add_document(MakeDocument(content, place)); });
 }
 
 void Writer::Replace(DocumentId id, const AnalyzedDocument& content, const std::string& place) {
@@ -387,10 +385,6 @@ SearchResult Reader::Search(const Query& query, const SearchOptions& options) co
     result.exact = found.get_matches_lower_bound() == found.get_matches_upper_bound();
     return result;
   });
-}
-
-std::string Reader::Suggest(const std::string& word) const {
-  return Guard([&] { return impl_->database.get_spelling_suggestion(word); });
 }
 
 bool IsSound(const std::string& directory) {

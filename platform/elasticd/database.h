@@ -69,9 +69,9 @@ class Writer final : public Store {
 
   void Set(const std::string& key, const std::string& value);
 
-  // The identifier that the next Add() gives.
+  // The identifier that the next Add() gives its document.
   DocumentId NextId() const;
-  DocumentId Add(const AnalyzedDocument& content, const std::string& place);
+  void Add(const AnalyzedDocument& content, const std::string& place);
   void Replace(DocumentId id, const AnalyzedDocument& content, const std::string& place);
   void Change(DocumentId id, const DocumentChanges& changes);
   void Delete(DocumentId id);
@@ -120,9 +120,6 @@ class Reader final : public Store {
   std::string Place(DocumentId id) const override;
 
   SearchResult Search(const Query& query, const SearchOptions& options) const;
-
-  // The word of the suggestions that is most like this one; empty where it is known itself or nothing is like it.
-  std::string Suggest(const std::string& word) const;
 
  private:
   struct Impl;

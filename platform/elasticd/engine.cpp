@@ -316,7 +316,8 @@ void Engine::IndexConfigSet(const Json::Value& data, Answer&) {
 }
 
 void Engine::DocumentUpsert(const Json::Value& data, Answer&) {
-  Get(data)->Upsert(Text(data, "doc_id"), Object(data, "data"));
+  Json::Value fields = Object(data, "data");
+  Get(data)->Accept(Text(data, "doc_id"), fields, [] {});
 }
 
 void Engine::DocumentSet(const Json::Value& data, Answer&) {

@@ -326,14 +326,6 @@ void Index::Finish(Open& open, const MakeWay* make_way) {
   Account(open, bytes, make_way);
 }
 
-void Index::Upsert(const std::string& path, const Json::Value& fields) {
-  Check(path, fields);
-  Run(Access::kChange, [&](Open& open) {
-    Save(open, path, fields, open.analyzer.Analyze(fields, path_fields_.unindexed()));
-    Account(open, BytesOf(fields));
-  });
-}
-
 void Index::Accept(const std::string& path, Json::Value& fields, const MakeWay& make_way) {
   Check(path, fields);
   const auto accept = [&](Open& open) {

@@ -74,11 +74,9 @@ class Index {
   // Deletes the database's files. The object answers 609 from then on.
   void Delete();
 
-  void Upsert(const std::string& path, const Json::Value& fields);
-
-  // The same in two steps. Accept() refuses what can be refused and takes the fields away; what happens to the document
-  // afterwards is as with any accepted change. Settle() indexes it, unless somebody had to do so before. Both call
-  // `make_way` before they wait or write much. Settle() throws nothing.
+  // Makes or replaces a document, in two steps. Accept() refuses what can be refused and takes the fields away; what
+  // happens to the document afterwards is as with any accepted change. Settle() indexes it, unless somebody had to do
+  // so before. Both call `make_way` before they wait or write much. Settle() throws nothing.
   using MakeWay = std::function<void()>;
   void Accept(const std::string& path, Json::Value& fields, const MakeWay& make_way);
   void Settle(const MakeWay& make_way);

@@ -80,6 +80,7 @@ void Index::SearchCommitted(const SearchRequest& request, Answer& answer) {
       if (packed.empty()) return Json::Value();  // deleted since
       const Place place = UnpackPlace(packed);
       const std::string directory = places.DirectoryPath(place.directory);
+      if (names.empty() && with_score) return Json::Value(Json::objectValue);
       return ShowFields(reader, mapping_, path_fields_, hit.id, directory, place.name, names);
     });
     if (fields.isNull()) continue;

@@ -18,17 +18,16 @@ struct Query {
   enum Kind {
     kNothing,
     kEverything,
-    kTerm,        // `term`
-    kBeginning,   // any term that begins with `term`
-    kNumber,      // field number `field` from `low` to `high`, both included
-    kDocument,    // the one with the identifier `document`
-    kPlace,       // in one of `directories`, with a name that begins with `term`
-    kAnd,         // all of `parts`
-    kOr,          // any of `parts`, the more the better
-    kSame,        // any of `parts`, which count as one word
-    kAndNot,      // the first of `parts`, none of the others
-    kAndPerhaps,  // the first of `parts`, which the others make better
-    kFilter       // all of `parts`, of which only the first says how good it is
+    kTerm,       // `term`
+    kBeginning,  // any term that begins with `term`
+    kNumber,     // field number `field` from `low` to `high`, both included
+    kDocument,   // the one with the identifier `document`
+    kPlace,      // in one of `directories`, with a name that begins with `term`
+    kAnd,        // all of `parts`
+    kOr,         // any of `parts`, the more the better
+    kSame,       // any of `parts`, which count as one word
+    kAndNot,     // the first of `parts`, none of the others
+    kAndPerhaps  // the first of `parts`, which the others make better
   };
 
   Kind kind = kNothing;

@@ -62,7 +62,7 @@ void Worker::Read(Connection& connection) {
 
 // Who has connected is about to say why. Where nobody else is there, waiting for that costs less than handing over.
 bool Worker::ComesSoon(const Connection& connection) const {
-  if (connection.answers != 0 || !connection.reader.empty() || !table_.IsOnly(connection)) return false;
+  if (connection.answers != 0 || !connection.reader.empty() || table_.HasSeveral()) return false;
   pollfd ready = {connection.fd.get(), POLLIN, 0};
   return poll(&ready, 1, kSoonMilliseconds) == 1;
 }
@@ -112,13 +112,13 @@ bool Worker::Consume(Connection& connection, std::string_view data) {
 
 // False where the connection was handed back, with `rest` for later.
 bool Worker::CarryOut(Connection& connection, std::string_view rest) {
-  if (!table_.IsOnly(connection)) make_way_();
+  if (table_.HasSeveral()) make_way_();
   if (connection.listed) table_.Unlist(connection);
   answer_->Clear();
   const Server::Rest todo = shared_.handler(connection.reader.text(), *answer_, make_way_);
   const bool goes_on = SendAnswer(connection, rest);
   if (!todo) return goes_on;
-  if (!goes_on || !table_.IsOnly(connection)) make_way_();
+  if (!goes_on || table_.HasSeveral()) make_way_();
   todo();
   return goes_on;
 }

@@ -19,7 +19,13 @@ void SendWorkerCommand(const char* command, const std::string& share_name) {
   SendCommandToDaemon(command, data);
 }
 
-void SetPausedAndSave(FolderMgr& folder_mgr, const std::string& share_name, bool paused) {
+// Does nothing for a share without folders.
+void ChangePaused(const std::string& share_name, bool paused) {
+  const FolderMgr folder_mgr;
+  if (!folder_mgr.IsShareIndexed(share_name)) return;
+  OpenShares shares;
+  MonitorConfigs monitors(folder_mgr, shares);
+  paused ? PauseShare(share_name, monitors) : ResumeShare(share_name, monitors);
   for (const auto& folder : folder_mgr.GetFolders()) {
     if (folder->GetShare() == share_name) folder->SetPaused(paused);
   }
@@ -82,22 +88,12 @@ void ShareCheckRecycle(const std::string& share_name) {
 
 void SharePause(const std::string& share_name) {
   if (share_name.empty()) QUARROX_THROW("share_name.empty()", kErrBadParameter, "Missing share name");
-  FolderMgr folder_mgr;
-  if (!folder_mgr.IsShareIndexed(share_name)) return;
-  OpenShares shares;
-  MonitorConfigs monitors(folder_mgr, shares);
-  PauseShare(share_name, monitors);
-  SetPausedAndSave(folder_mgr, share_name, true);
+  ChangePaused(share_name, true);
 }
 
 void ShareResume(const std::string& share_name) {
   if (share_name.empty()) QUARROX_THROW("share_name.empty()", kErrBadParameter, "Missing share name");
-  FolderMgr folder_mgr;
-  if (!folder_mgr.IsShareIndexed(share_name)) return;
-  OpenShares shares;
-  MonitorConfigs monitors(folder_mgr, shares);
-  ResumeShare(share_name, monitors);
-  SetPausedAndSave(folder_mgr, share_name, false);
+  ChangePaused(share_name, false);
 }
 
 void ShareRebuild(const std::string& share_name) {

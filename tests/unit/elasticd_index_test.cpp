@@ -102,7 +102,6 @@ class IndexModel : public ::testing::Test {
       case 1: {
         const std::string path = AnyPath();
         Json::Value fields = documents_[path] = AnyFields(path);
-        if (Below(2) == 0) return index_->Upsert(path, fields);
         index_->Accept(path, fields, [] {});
         if (Below(2) == 0) index_->Settle([] {});
         return;
