@@ -57,7 +57,7 @@ void MonitorFiles::Watch() {
 
 bool MonitorFiles::ReadAll() {
   std::set<std::string> names;
-  for (const auto& [name, entry] : entries_) names.insert(name);
+  for (const auto& [name, monitor] : monitors_) names.insert(name);
   std::error_code error;
   for (std::filesystem::directory_iterator file(directory_, error), end; !error && file != end; file.increment(error)) {
     const std::string name = file->path().filename().string();
@@ -70,7 +70,7 @@ bool MonitorFiles::ReadAll() {
 
 bool MonitorFiles::Remove(const std::string& name) {
   refused_.erase(name);
-  return entries_.erase(name) != 0;
+  return monitors_.erase(name) != 0;
 }
 
 bool MonitorFiles::Refuse(const std::string& name, const std::string& why) {
@@ -80,7 +80,7 @@ bool MonitorFiles::Refuse(const std::string& name, const std::string& why) {
   errno = 0;
   QUARROX_LOG_FAILURE("A configuration is not followed, path=%s, reason=%s; %s",
                       log::Text(Join(directory_, name)).c_str(), log::Text(why).c_str(),
-                      entries_.contains(name) ? "what it said before stays in force" : "write it anew");
+                      monitors_.contains(name) ? "what it said before stays in force" : "write it anew");
   return false;
 }
 
@@ -96,10 +96,8 @@ bool MonitorFiles::Read(const std::string& name) {
     if (!fromFile(value, path)) {
       return access(path.c_str(), F_OK) != 0 ? Remove(name) : Refuse(name, "it is not JSON");
     }
-    Monitor monitor = ParseMonitor(value);
-    const bool was_refused = refused_.erase(name) != 0;
-    const bool known = entries_.contains(name);
-    entries_[name] = {std::move(monitor), was_refused && !known};
+    monitors_[name] = ParseMonitor(value);
+    refused_.erase(name);
     return true;
   } catch (const Error& error) {
     return Refuse(name, error.reason);

@@ -15,12 +15,6 @@ inline constexpr char kMonitorDirectory[] = "/var/lib/vexonotifyd";
 
 class MonitorFiles {
  public:
-  struct Entry {
-    Monitor monitor;
-    // Since when it is to be served is not known: it was there, but could not be read until now.
-    bool overdue = false;
-  };
-
   // Makes the directory (mode 0700) where it is missing and reads all that is in it. Throws Error 502 where it cannot
   // be watched.
   explicit MonitorFiles(const std::string& directory);
@@ -33,7 +27,7 @@ class MonitorFiles {
   bool Refresh();
 
   // What is in force, by file name.
-  const std::map<std::string, Entry>& entries() const { return entries_; }
+  const std::map<std::string, Monitor>& monitors() const { return monitors_; }
 
  private:
   void Watch();
@@ -45,7 +39,7 @@ class MonitorFiles {
 
   const std::string directory_;
   UniqueFd inotify_;
-  std::map<std::string, Entry> entries_;
+  std::map<std::string, Monitor> monitors_;
   std::map<std::string, std::string> refused_;  // what is wrong with a file, as logged
 };
 

@@ -30,30 +30,27 @@ int Earlier(int a, int b) {
 MonitorService::MonitorService(const Options& options, const std::string& directory)
     : files_(std::make_unique<MonitorFiles>(directory)), watches_(options.method, options.limited_queue) {
   Follow();
-  started_ = true;
   Flush();
 }
 
 MonitorService::MonitorService(const Options& options, const Monitor& monitor)
-    : fixed_{{"", {monitor, false}}}, watches_(options.method, options.limited_queue), started_(true) {
+    : fixed_{{"", monitor}}, watches_(options.method, options.limited_queue) {
   Follow();
   if (!watches_.unheard().empty()) throw Error(kErrSystem, watches_.unheard().begin()->second);
 }
 
 void MonitorService::OpenQueues() {
-  for (const auto& [name, entry] : entries()) {
-    const auto [queue, is_new] = queues_.try_emplace(entry.monitor.queue);
-    if (is_new) queue->second = std::make_unique<QueueWriter>(entry.monitor.queue);
-    if (entry.monitor.folders.empty()) continue;
-    queue->second->set_root(entry.monitor.folders.front().path);
-    if (is_new && (!started_ || entry.overdue)) to_mark_.emplace(queue->second.get(), queue->second->root());
+  for (const auto& [name, monitor] : monitors()) {
+    const auto [queue, is_new] = queues_.try_emplace(monitor.queue);
+    if (is_new) queue->second = std::make_unique<QueueWriter>(monitor.queue);
+    if (!monitor.folders.empty()) queue->second->set_root(monitor.folders.front().path);
   }
 }
 
 // What was seen while a configuration stood is still written, as far as that works at once.
 void MonitorService::CloseQueues() {
   std::unordered_set<std::string_view> kept;
-  for (const auto& [name, entry] : entries()) kept.insert(entry.monitor.queue);
+  for (const auto& [name, monitor] : monitors()) kept.insert(monitor.queue);
   for (auto queue = queues_.begin(); queue != queues_.end();) {
     if (kept.contains(queue->first)) {
       ++queue;
@@ -61,15 +58,16 @@ void MonitorService::CloseQueues() {
     }
     queue->second->FlushNow();
     real_queues_.erase(queue->first);
+    followed_.erase(queue->second.get());
     queue = queues_.erase(queue);
   }
 }
 
 std::vector<WantedFolder> MonitorService::Wanted() {
   std::vector<WantedFolder> wanted;
-  for (const auto& [name, entry] : entries()) {
-    EventSink* queue = queues_.at(entry.monitor.queue).get();
-    for (const MonitoredFolder& folder : entry.monitor.folders) {
+  for (const auto& [name, monitor] : monitors()) {
+    EventSink* queue = queues_.at(monitor.queue).get();
+    for (const MonitoredFolder& folder : monitor.folders) {
       wanted.push_back({&places_.places().at(folder.path), &folder, queue, {}});
     }
   }
@@ -99,6 +97,22 @@ void MonitorService::Tell(const std::vector<WantedFolder>& wanted, const FolderP
   }
 }
 
+// Whoever configures a folder looks at it about then, but maybe before it was watched; a queue that was not served may
+// have been served before. What happened meanwhile is not known.
+void MonitorService::TellNew(const std::vector<WantedFolder>& wanted) {
+  std::map<EventSink*, std::set<std::string>> followed;
+  for (const WantedFolder& one : wanted) {
+    const auto before = followed_.find(one.queue);
+    if (before == followed_.end()) {
+      to_mark_.emplace(one.queue, one.folder->path);
+    } else if (one.place->there && !before->second.contains(one.folder->path) && (one.folder->mask & kCreated) != 0) {
+      one.queue->Add({kCreated, true, one.folder->path, {}});
+    }
+    followed[one.queue].insert(one.folder->path);
+  }
+  followed_ = std::move(followed);
+}
+
 void MonitorService::NoteUnheard() {
   for (const auto& [path, why] : watches_.unheard()) was_unheard_.insert(path);
 }
@@ -123,8 +137,8 @@ void MonitorService::Follow() {
   watches_.DrainAll();
   NoteUnheard();
   std::unordered_set<std::string> folders;
-  for (const auto& [name, entry] : entries()) {
-    for (const MonitoredFolder& folder : entry.monitor.folders) folders.insert(folder.path);
+  for (const auto& [name, monitor] : monitors()) {
+    for (const MonitoredFolder& folder : monitor.folders) folders.insert(folder.path);
   }
   places_.Keep(folders);
   const FolderPlaces::Changes changes = places_.Look();
@@ -132,6 +146,7 @@ void MonitorService::Follow() {
   const std::vector<WantedFolder> wanted = Wanted();
   watches_.Arrange(wanted, QueuePaths());
   Tell(wanted, changes);
+  if (files_ != nullptr) TellNew(wanted);
   MarkHeardAgain(wanted);
   for (const auto& [queue, path] : std::exchange(to_mark_, {})) queue->Add({kLost, false, path, {}});
   CloseQueues();

@@ -1,10 +1,10 @@
 // Serves monitor configurations: keeps the watches and the queues in step with the configurations and with the folders,
 // and writes the marks that say that a queue is not complete.
 //
-// A queue gets that mark when its configuration was there before the service, and when one of its folders comes back or
-// could not be watched for a while. A configuration or a folder that is new gets none: whoever adds it has it indexed.
-// A folder that appears only after it was configured is written as created, one that goes as deleted; but for a disk
-// that is unmounted nothing is written, because its files are as they were.
+// A queue gets that mark when the service begins to serve it, and when one of its folders comes back or could not be
+// watched for a while. A folder that joins those of a queue is written as created, and so is one that appears only
+// after it was configured; one that goes is written as deleted, but for a disk that is unmounted nothing is written,
+// because its files are as they were.
 //
 // Not thread-safe.
 #pragma once
@@ -52,28 +52,29 @@ class MonitorService {
 
  private:
   using Clock = std::chrono::steady_clock;
-  using Entries = std::map<std::string, MonitorFiles::Entry>;
+  using Monitors = std::map<std::string, Monitor>;
 
-  const Entries& entries() const { return files_ == nullptr ? fixed_ : files_->entries(); }
+  const Monitors& monitors() const { return files_ == nullptr ? fixed_ : files_->monitors(); }
   void Follow();
   void OpenQueues();
   void CloseQueues();
   std::vector<WantedFolder> Wanted();
   std::vector<std::string> QueuePaths();
   void Tell(const std::vector<WantedFolder>& wanted, const FolderPlaces::Changes& changes);
+  void TellNew(const std::vector<WantedFolder>& wanted);
   void NoteUnheard();
   void MarkHeardAgain(const std::vector<WantedFolder>& wanted);
   void Flush();
 
-  Entries fixed_;
+  Monitors fixed_;
   std::unique_ptr<MonitorFiles> files_;
   FolderPlaces places_;
   std::map<std::string, std::unique_ptr<QueueWriter>> queues_;  // by path
   std::map<std::string, std::string> real_queues_;              // their real paths, as long as nothing was moved
   std::map<EventSink*, std::string> to_mark_;                   // and the path that the mark bears
+  std::map<EventSink*, std::set<std::string>> followed_;        // the folders that each queue has told of
   std::set<std::string> was_unheard_;                           // folders, whose queues are to be marked
   Watches watches_;                                             // after the queues, which they write to
-  bool started_ = false;
   Clock::time_point retry_ = Clock::time_point::max();
 };
 

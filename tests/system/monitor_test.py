@@ -80,8 +80,12 @@ class MonitorTest(unittest.TestCase):
         self.daemon.terminate()
         self.assertEqual(self.daemon.wait(), 0)
         self.assertEqual({str(p) for p in pathlib.Path(DOCS).rglob("[0-9]*")} - {line[1] for line in self.lines("docs")}, set())
-        for text, counts in ("sub/once", [1, 0, 1]), ('"event":512', [1, 0, 0]), ("unheard", [0, 0, 0]):
+        for text, counts in ("sub/once", [1, 0, 1]), ("unheard", [0, 0, 0]):
             self.assertEqual([self.queue[name].read_text().count(text) for name in ("docs", "photos", "other")], counts)
+        self.assertEqual(self.queue["docs"].read_text().count('"event":512'), 1)
+        self.assertIn((CREATED, SUB, None, True), self.lines("docs"))  # it joined: before it was watched it may have changed
+        for name, root in ("photos", PHOTOS), ("other", SUB):
+            self.assertIn((LOST, root, None, False), self.lines(name))
 
     def test_masks_and_ignored_names_hold_for_each_queue_until_a_good_configuration_comes(self):
         self.queue["other"] = pathlib.Path(DOCS, "queue")
@@ -91,7 +95,7 @@ class MonitorTest(unittest.TestCase):
         self.start()
         machine.write(CONFIGS + "docs.json", "{")
         self.configure("photos", PHOTOS)
-        self.expect("photos", (LOST, PHOTOS))  # since when it should have been served is not known
+        self.expect("photos", (LOST, PHOTOS))
         for old, new in ("skip/d", "sub/d"), ("sub/d", "sub/e"), ("sub/e", "skip/e"):
             os.rename(f"{DOCS}/{old}", f"{DOCS}/{new}")
             time.sleep(0.1)  # or else only what came of it may be written
@@ -106,6 +110,7 @@ class MonitorTest(unittest.TestCase):
         self.start()
         self.configure("docs", LATE, DISK)
         self.configure("other", VOLUME)
+        self.expect("docs", (LOST, LATE))
         self.until_heard("other", DISK + "/a")
         for turn, first in ("1", CREATED), ("2", LOST):
             os.makedirs(LATE)
