@@ -22,6 +22,9 @@ constexpr size_t kDirectoryBytes = sizeof(DirectoryId);
 // The library commits by itself after so many changes, in the middle of a document's; a transaction keeps it from that.
 constexpr bool kFlushed = true;
 
+// Up to so many hits the total is exact. A person sees at once that it is not, and more would cost time.
+constexpr uint64_t kCountedHits = 100;
+
 [[noreturn]] void Translate(const Xapian::Error& error) {
   const std::string text = error.get_description();
   const char* system = error.get_error_string();
@@ -375,7 +378,8 @@ SearchResult Reader::Search(const Query& query, const SearchOptions& options) co
     for (const auto& [field, descending] : options.sort) keys.add_value(kFirstNumberSlot + field, descending);
     if (!options.sort.empty()) enquire.set_sort_by_key_then_relevance(&keys, false);
     const uint64_t all = impl_->database.get_doccount();
-    const Xapian::MSet found = enquire.get_mset(Bound(options.from, all), Bound(options.size, all));
+    const Xapian::MSet found =
+        enquire.get_mset(Bound(options.from, all), Bound(options.size, all), Bound(kCountedHits, all));
     SearchResult result;
     result.hits.reserve(found.size());
     for (Xapian::MSetIterator hit = found.begin(); hit != found.end(); ++hit) {

@@ -37,6 +37,7 @@ struct Hit {
 struct Found {
   std::vector<Hit> hits = {};  // the best of each share
   uint64_t total = 0;
+  bool total_is_exact = true;
 };
 
 Json::Value Query(const char* kind, const char* field, const std::string& text) {
@@ -100,6 +101,8 @@ void SearchShare(const std::string& share, const Json::Value& qsl, uint64_t want
   if (!hits.isArray()) throw Error(kErrEngineNoData, toString(response));
   for (const Json::Value& hit : hits) found.hits.push_back(AsHit(share, hit));
   found.total += std::max(static_cast<uint64_t>(NumberOf(response, "total")), uint64_t{hits.size()});
+  const Json::Value& exact = std::as_const(response)["exact"];
+  if (exact.isBool() && !exact.asBool()) found.total_is_exact = false;
 }
 
 Found SearchShares(const std::set<std::string>& shares, const Json::Value& qsl, uint64_t wanted) {
@@ -153,18 +156,20 @@ std::string DateOf(const Hit& hit) {
   return text;
 }
 
-void PrintHits(const std::vector<Hit>& hits, size_t offset, uint64_t total) {
-  if (total == 0) {
+void PrintHits(const Found& found, size_t offset) {
+  const std::vector<Hit>& hits = found.hits;
+  if (found.total == 0) {
     std::cout << "nothing found\n";
     return;
   }
   std::vector<std::vector<std::string>> rows = {{"PATH", "SIZE", "CHANGED"}};
   for (const Hit& hit : hits) rows.push_back({Visible(hit.path), SizeOf(hit), DateOf(hit)});
   if (rows.size() > 1) PrintTable(std::cout, rows);
+  const char* about = found.total_is_exact ? "" : "about ";
   if (hits.empty()) {
-    std::cout << total << " found, none from " << offset << " on\n";
+    std::cout << about << found.total << " found, none from " << offset << " on\n";
   } else {
-    std::cout << offset + 1 << " to " << offset + hits.size() << " of " << total << '\n';
+    std::cout << offset + 1 << " to " << offset + hits.size() << " of " << about << found.total << '\n';
   }
 }
 
@@ -190,7 +195,7 @@ int Search(const Arguments& arguments) {
   if (arguments.Has("--json")) {
     for (const Hit& hit : hits) std::cout << AsJson(hit) << '\n';
   } else {
-    PrintHits(hits, offset, found.total);
+    PrintHits(found, offset);
   }
   return kDone;
 }
