@@ -99,6 +99,7 @@ class SearchTest(unittest.TestCase):
         for seconds in (0.3, 0.6, 0.1):
             time.sleep(seconds)
             self.engine.kill()
+            self.engine.wait()
             self.start_engine()
         self.until_found(names, "plenty")
         self.engine.kill()
