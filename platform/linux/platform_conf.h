@@ -6,7 +6,10 @@
 namespace platform {
 
 struct PlatformConf {
-  bool manage_samba = false;  // "manage samba": Samba's service may be started, stopped and restarted
+  bool manage_samba = false;      // "manage samba": Samba's service may be restarted, and what it includes be written
+  std::string notice_mail;        // "notice mail": the address that notices are sent to
+  std::string notice_command;     // "notice command": the program that is run for each notice
+  unsigned int notice_time = 10;  // "notice time limit": seconds until a mail or a command is given up
 };
 
 // Reads the file as it stands now, in the syntax of smb.conf, without sections. Where it does not exist everything has

@@ -117,6 +117,14 @@ const std::vector<Command> kCommands = {
      0,
      Call,
      kAnyNumber},
+    {"help",
+     "",
+     "[--man] [--complete] [COMMAND...]",
+     "explain all commands, or those that begin with the words behind it",
+     {"--man", "--complete"},
+     0,
+     Help,
+     kAnyNumber},
 };
 
 }  // namespace

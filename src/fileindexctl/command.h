@@ -47,7 +47,7 @@ struct Command {
   const char* verb;               // empty for a command of one word
   const char* synopsis;           // what follows
   const char* help;               // one line
-  std::set<std::string> options;  // as Arguments knows them
+  std::set<std::string> options;  // as Arguments knows them; help.cpp says what each does
   size_t operands;                // how many it takes
   int (*run)(const Arguments& arguments);
   size_t optional_operands = 0;  // how many more it takes
@@ -68,6 +68,7 @@ int FolderList(const Arguments& arguments);
 int FolderReindex(const Arguments& arguments);
 int FolderSet(const Arguments& arguments);
 int FolderSummary(const Arguments& arguments);
+int Help(const Arguments& arguments);
 int Pause(const Arguments& arguments);
 int QueueFold(const Arguments& arguments);
 int QueueList(const Arguments& arguments);

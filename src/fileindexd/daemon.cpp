@@ -8,6 +8,8 @@
 #include <iterator>
 #include <vector>
 
+#include <systemd/sd-daemon.h>
+
 #include "common/log.h"
 
 namespace quarrox::fileindexd {
@@ -19,6 +21,7 @@ Daemon::Daemon(const std::string& socket_path, bool foreground)
 void Daemon::TakeSignals() {
   for (int signal; (signal = signals_.Take()) != 0;) {
     if ((signal != SIGTERM && signal != SIGINT) || stop_at_ != kNever) continue;
+    sd_notify(0, "STOPPING=1");
     socket_.Close();
     pool_.EndAll();
     look_at_ = kNever;
@@ -95,6 +98,7 @@ void Daemon::RunOnce() {
 }
 
 void Daemon::Run() {
+  sd_notify(0, "READY=1");  // the socket listens
   do RunOnce();
   while (stop_at_ == kNever || (!pool_.empty() && Clock::now() < stop_at_));
 }

@@ -62,13 +62,16 @@ bool fromFile(Json::Value& value, const std::string& path) {
 }
 
 bool toFile(const Json::Value& value, const std::string& path) {
+  return ReplaceFile(path, toString(value) + "\n");
+}
+
+bool ReplaceFile(const std::string& path, const std::string& text) {
   const UniqueFd directory(OpenDirectoryOf(path));  // first: nothing but the disk itself may fail after the rename
   if (directory.get() < 0) return false;
   std::string temporary = path + ".XXXXXX";
   UniqueFd fd(mkostemp(temporary.data(), O_CLOEXEC));
   if (fd.get() < 0) return false;
-  if (WriteTemporary(fd.get(), path, toString(value) + "\n") && fd.Close() &&
-      rename(temporary.c_str(), path.c_str()) == 0) {
+  if (WriteTemporary(fd.get(), path, text) && fd.Close() && rename(temporary.c_str(), path.c_str()) == 0) {
     return fsync(directory.get()) == 0;
   }
   const int error = errno;

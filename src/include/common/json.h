@@ -30,6 +30,9 @@ QUARROX_API bool fromFile(Json::Value& value, const std::string& path);
 // failure; the old text is then still there, save where only the last sync of the directory failed.
 QUARROX_API bool toFile(const Json::Value& value, const std::string& path);
 
+// The same with any text, as it stands.
+bool ReplaceFile(const std::string& path, const std::string& text);
+
 // ", data=" and the compact text of the value; ends the reasons of errors.
 QUARROX_API std::string AppendData(const Json::Value& value);
 
