@@ -59,6 +59,12 @@ QUARROX_API void FolderSummary(Json::Value& result);
 QUARROX_API void FolderAdd(const Json::Value& folder_list, bool updater_mode);
 QUARROX_API void FolderSet(const Json::Value& folder_list, bool updater_mode);
 
+// FolderSet of one folder that is in the list, by the members that are to change: read, changed and saved under one
+// lock, so that of two processes that change different members at once neither undoes what the other did. `result` gets
+// the record as it is then. Throws Error 902 where there is no folder at this path, 120 where `changes` is no object or
+// names another path, and as FolderSet; before anything is changed.
+QUARROX_API void FolderChange(Json::Value& result, const std::string& path, const Json::Value& changes);
+
 // Takes folders out of the list, by an array of their paths; a path that is no folder is passed over. A share that has
 // no folder left loses its index, monitor configuration and files; where no folder is left at all, the related services
 // are switched off. Under the folder lock. Throws Error 120 where the request is no array of strings, or one can be no

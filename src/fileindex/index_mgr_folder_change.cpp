@@ -6,6 +6,7 @@
 #include <map>
 #include <memory>
 #include <set>
+#include <utility>
 #include <vector>
 
 #include "common/error.h"
@@ -65,6 +66,9 @@ class Upsertion {
   // Checks a record and takes it into the list in memory.
   void Take(const Json::Value& data);
 
+  // Takes the record of the list, with changes; returns it.
+  Json::Value TakeChanged(const std::string& path, const Json::Value& changes);
+
   // Saves the list and brings everything else in line with it.
   void Finish();
 
@@ -110,6 +114,19 @@ void Upsertion::Take(const Json::Value& data) {
   }
   reindex_.push_back(changed);
   if (touched_.emplace(share, is_new).second) CheckRoom(share);
+}
+
+Json::Value Upsertion::TakeChanged(const std::string& path, const Json::Value& changes) {
+  FolderPtr folder;
+  folder_mgr_.Get(folder, path);
+  Json::Value record = folder->GetData();
+  JsonApplyChanges(record, changes);
+  if (record["path"] != path) {
+    QUARROX_THROW_IN("FolderChange", "record[\"path\"] != path", kErrBadParameter,
+                     "A folder keeps its path: " + toString(changes));
+  }
+  Take(record);
+  return record;
 }
 
 void Upsertion::Finish() {
@@ -204,6 +221,15 @@ void FolderAdd(const Json::Value& folder_list, bool updater_mode) {
 
 void FolderSet(const Json::Value& folder_list, bool updater_mode) {
   FolderUpsert(folder_list, false, updater_mode);
+}
+
+void FolderChange(Json::Value& result, const std::string& path, const Json::Value& changes) {
+  const LockFile lock(kFolderLockPath, true);
+  Upsertion upsertion(false, false);
+  if (!changes.isObject()) QUARROX_THROW("!changes.isObject()", kErrBadParameter, toString(changes));
+  Json::Value record = upsertion.TakeChanged(path, changes);
+  upsertion.Finish();
+  result = std::move(record);
 }
 
 void FolderDelete(const Json::Value& path_list) {

@@ -16,7 +16,6 @@
 namespace quarrox::fileindex {
 namespace {
 
-constexpr char kLockPath[] = "/tmp/quarrox_cfg_fi_status.lock";
 constexpr char kResumeTime[] = "resume_time";
 constexpr char kShare[] = "share";
 
@@ -77,25 +76,25 @@ int StatusMgr::GetShareStatus(const std::string& share) const {
 }
 
 void StatusMgr::SetShareStatus(const std::string& share, int flags) {
-  const LockFile lock(kLockPath, true);
+  const LockFile lock(kStatusLockPath, true);
   ChangeFlags(data_, share, flags, 0);
   Save();
 }
 
 void StatusMgr::UnsetShareStatus(const std::string& share, int flags) {
-  const LockFile lock(kLockPath, true);
+  const LockFile lock(kStatusLockPath, true);
   ChangeFlags(data_, share, 0, flags);
   Save();
 }
 
 void StatusMgr::ClearShareStatus(const std::string& share) {
-  const LockFile lock(kLockPath, true);
+  const LockFile lock(kStatusLockPath, true);
   if (SharesOf(data_).isMember(share)) data_[kShare].removeMember(share);
   Save();
 }
 
 void StatusMgr::Pause(int hours) {
-  const LockFile lock(kLockPath, true);
+  const LockFile lock(kStatusLockPath, true);
   if (hours < 0) QUARROX_THROW("hours < 0", kErrBadParameter, "Pause length should NOT be negative");
   const int64_t resume_time = ResumeTime(hours);
   ChangeResumeTime(data_, resume_time);
@@ -106,7 +105,7 @@ void StatusMgr::Pause(int hours) {
 }
 
 void StatusMgr::Resume() {
-  const LockFile lock(kLockPath, true);
+  const LockFile lock(kStatusLockPath, true);
   ChangeResumeTime(data_, kNotPaused);
   Save();
   SendCommandToDaemon("resume", Json::Value());

@@ -12,6 +12,9 @@ namespace quarrox::fileindex {
 
 inline constexpr char kFileIndexStatusCfgPath[] = "/var/packages/Quarrox/etc/fileindex.status";
 
+// The lock file under which it is written.
+inline constexpr char kStatusLockPath[] = "/tmp/quarrox_cfg_fi_status.lock";
+
 // The status flags of a share, to be combined.
 enum ShareStatusFlag : int {
   kShareNeedReindex = 1,  // its index misses something that only a reindex finds

@@ -103,6 +103,7 @@ const std::vector<Operation>& Operations() {
       Question("FolderSummary", fileindex::FolderSummary),
       Change("FolderAdd", fileindex::FolderAdd, "folder_list", "updater_mode"),
       Change("FolderSet", fileindex::FolderSet, "folder_list", "updater_mode"),
+      Question("FolderChange", fileindex::FolderChange, "path", "changes"),
       Change<const Json::Value&>("FolderDelete", fileindex::FolderDelete, "path_list"),
       Change<const std::string&>("FolderDeleteByShare", fileindex::FolderDelete, "share_name"),
       Change("FolderReindex", fileindex::FolderReindex, "path_list"),

@@ -60,6 +60,7 @@ std::string NameOf(const Command& command);
 const std::vector<Command>& Commands();
 
 int Call(const Arguments& arguments);
+int Doctor(const Arguments& arguments);
 int FolderAdd(const Arguments& arguments);
 int FolderDelete(const Arguments& arguments);
 int FolderGet(const Arguments& arguments);

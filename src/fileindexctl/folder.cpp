@@ -6,9 +6,13 @@
 #include <vector>
 
 #include "command.h"
+#include "common/error.h"
 #include "common/json.h"
+#include "common/sdk/share.h"
+#include "common/strings.h"
 #include "fileindex/folder_mgr.h"
 #include "output.h"
+#include "typed_path.h"
 
 namespace quarrox::ctl {
 namespace {
@@ -49,6 +53,17 @@ void PrintFolder(const Folder& folder) {
   PrintRow("paused      ", YesNo(folder.IsPaused()));
 }
 
+// The share path of the folder that a person means. Throws Error 902 where there is none, and says which folder governs
+// what lies below one.
+std::string FolderPath(const FolderMgr& folder_mgr, const std::string& typed) {
+  if (folder_mgr.HasFolder(typed)) return typed;  // also in a share that is gone
+  std::string path = AsSharePath(typed, sdk::SDKShare::Enum());
+  if (folder_mgr.HasFolder(path)) return path;
+  std::string above = Dirname(path);
+  while (!above.empty() && !folder_mgr.HasFolder(above)) above = Dirname(above);
+  throw Error(kErrNoSuchFolder, above.empty() ? path : path + "; it is governed by the folder " + above);
+}
+
 }  // namespace
 
 int FolderList(const Arguments& arguments) {
@@ -79,8 +94,10 @@ int FolderList(const Arguments& arguments) {
 }
 
 int FolderGet(const Arguments& arguments) {
+  const FolderMgr folder_mgr;
+  const std::string path = FolderPath(folder_mgr, arguments.operands().front());
   std::shared_ptr<Folder> folder;
-  FolderMgr().Get(folder, arguments.operands().front());
+  folder_mgr.Get(folder, path);
   if (arguments.Has("--json")) {
     std::cout << toString(folder->GetData()) << '\n';
   } else {

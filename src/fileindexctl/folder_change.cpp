@@ -9,7 +9,6 @@
 
 #include "command.h"
 #include "common/error.h"
-#include "common/file.h"
 #include "common/json.h"
 #include "common/sdk/share.h"
 #include "common/strings.h"
@@ -18,6 +17,7 @@
 #include "fileindex/util.h"
 #include "output.h"
 #include "refusal.h"
+#include "typed_path.h"
 
 namespace quarrox::ctl {
 namespace {
@@ -31,29 +31,6 @@ void Tell(const std::string& what) {
 }
 
 // --- paths -----------------------------------------------------------------------------------------------------------
-
-// A path as a person typed it: without the slashes that a shell's completion leaves, a relative one from here.
-std::string Absolute(const std::string& typed) {
-  if (typed.empty()) throw UsageError("PATH is empty");
-  std::string path = typed.front() == '/' ? typed : RealPath(typed);
-  if (path.empty()) throw UsageError("there is no '" + typed + "' here; a share path begins with \"/\"");
-  while (path.size() > 1 && path.back() == '/') path.pop_back();
-  return path;
-}
-
-// A share path is told from a full one by its first component. What no share holds stays for the library to refuse.
-std::string AsSharePath(const std::string& typed, const std::set<std::string>& shares) {
-  std::string path = Absolute(typed);
-  if (shares.count(fileindex::GetShareNameByPath(path)) != 0) return path;
-  try {
-    std::string share;
-    std::string share_dir;
-    fileindex::GetShareNamePathByFullPath(share, share_dir, path);
-    return "/" + share + path.substr(share_dir.size());
-  } catch (const Error&) {
-    return path;
-  }
-}
 
 std::vector<std::string> SharePaths(const Arguments& arguments) {
   const std::set<std::string> shares = sdk::SDKShare::Enum();
@@ -167,18 +144,14 @@ int FolderAdd(const Arguments& arguments) {
   return Answer(arguments, answer, paths, "added");
 }
 
-// What is not named stays as it stands in the list. A change by somebody else between reading and saving is lost.
 int FolderSet(const Arguments& arguments) {
   const std::vector<std::string> paths = SharePaths(arguments);
+  Json::Value changes(Json::objectValue);
+  if (!TakeOptions(changes, arguments)) throw UsageError("there is nothing to change; see: fileindexctl --help");
   Json::Value record;
-  if (!TakeOptions(record, arguments)) throw UsageError("there is nothing to change; see: fileindexctl --help");
-  fileindex::FolderGet(record, paths.front());
-  TakeOptions(record, arguments);
-  Json::Value records(Json::arrayValue);
-  records.append(record);
-  Run(paths, [&] { fileindex::FolderSet(records, false); });
+  Run(paths, [&] { fileindex::FolderChange(record, paths.front(), changes); });
   Json::Value answer;
-  answer["folder"] = records;
+  answer["folder"].append(record);
   return Answer(arguments, answer, paths, "changed");
 }
 

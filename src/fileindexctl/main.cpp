@@ -28,7 +28,10 @@ const char* MeaningOf(int code) {
   static const std::map<int, const char*> meanings = {
       {quarrox::kErrShareEnum, "the shares cannot be listed"},
       {quarrox::kErrNoSuchShare, "there is no such share"},
+      {quarrox::kErrFolderExists, "the folder is indexed already"},
       {quarrox::kErrNoSuchFolder, "there is no such folder"},
+      {quarrox::kErrPathNotIndexable, "the folder cannot be indexed; 'fileindexctl explain' says why"},
+      {quarrox::kErrNoSpace, "there is no room for an index"},
   };
   const auto meaning = meanings.find(code);
   return meaning == meanings.end() ? "" : meaning->second;

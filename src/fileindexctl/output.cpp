@@ -1,6 +1,7 @@
 #include "output.h"
 
 #include <algorithm>
+#include <cstdio>
 #include <ostream>
 
 namespace quarrox::ctl {
@@ -28,6 +29,19 @@ std::string Visible(const std::string& text) {
     }
   }
   return result;
+}
+
+std::string SizeText(uint64_t bytes) {
+  if (bytes < 1024) return std::to_string(bytes) + " B";
+  double size = static_cast<double>(bytes) / 1024;
+  const char* unit = "KMGTPE";
+  while (size >= 1024) {
+    size /= 1024;
+    ++unit;
+  }
+  char text[32];
+  snprintf(text, sizeof(text), "%.1f %ciB", size, *unit);
+  return text;
 }
 
 void PrintTable(std::ostream& out, const std::vector<std::vector<std::string>>& rows) {

@@ -1,6 +1,7 @@
 // What the commands print: tables for people, one JSON object a line for programs.
 #pragma once
 
+#include <cstdint>
 #include <iosfwd>
 #include <string>
 #include <vector>
@@ -9,6 +10,9 @@ namespace quarrox::ctl {
 
 // A text that stays on one line and cannot drive the terminal: control bytes come out as \n, \x1b and so on.
 std::string Visible(const std::string& text);
+
+// A number of bytes: "17 B", "4.2 MiB".
+std::string SizeText(uint64_t bytes);
 
 // Rows of equally many texts, the first of which is the heading. Columns are as wide as their widest text.
 void PrintTable(std::ostream& out, const std::vector<std::vector<std::string>>& rows);

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cstdint>
-#include <cstdio>
 #include <ctime>
 #include <iostream>
 #include <set>
@@ -133,19 +132,9 @@ std::string AsJson(const Hit& hit) {
   return toString(object);
 }
 
-// "17 B", "4.2 MiB".
 std::string SizeOf(const Hit& hit) {
   if (hit.is_directory) return "directory";
-  if (hit.size < 1024) return std::to_string(hit.size) + " B";
-  double size = static_cast<double>(hit.size) / 1024;
-  const char* unit = "KMGTPE";
-  while (size >= 1024) {
-    size /= 1024;
-    ++unit;
-  }
-  char text[32];
-  snprintf(text, sizeof(text), "%.1f %ciB", size, *unit);
-  return text;
+  return SizeText(static_cast<uint64_t>(std::max<int64_t>(hit.size, 0)));
 }
 
 std::string DateOf(const Hit& hit) {

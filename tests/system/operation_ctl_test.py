@@ -57,6 +57,9 @@ class OperationCommandTest(unittest.TestCase):
             self.assertEqual(machine.ctl("folder", verb, path, "--types=audio")[1][0]["error"]["code"], code)
         self.assertEqual(machine.ctl("folder", "set", "/docs/a/b", "--types=audio,video", "--group=h")[0], 0)
         self.assertEqual(folders(), added | {"/docs/a/b": ("inner", "h", "audio", "video")})
+        self.assertEqual(machine.ctl("folder", "get", DOCS + "/a/b/")[1][0]["group"], "h")
+        governed = {"code": 902, "msg": "/docs/a/c/d; it is governed by the folder /docs/a"}
+        self.assertEqual(machine.ctl("folder", "get", DOCS + "/a/c/d"), (1, [{"success": False, "error": governed}]))
         self.assertEqual(machine.ctl("folder", "reindex", "/docs/a", "/void")[1][0]["passed_over"], ["/void"])
         self.assertEqual([machine.ctl("queue", "show", "docs")[1][-1][key] for key in ("op", "path")], [6, DOCS + "/a"])
         self.requests.clear()

@@ -2,6 +2,7 @@
 
 #include "common/lock_file.h"
 #include "fileindex/index_mgr.h"
+#include "support/call_capture.h"
 #include "support/fake_daemon.h"
 #include "support/index_mgr_test.h"
 
@@ -101,6 +102,29 @@ TEST_F(IndexMgrFolderTest, WhatChangesInAFolderIsQueuedAndTheLastOneLeavesNothin
   EXPECT_EQ(ReasonOf(901, add(Record("/homes/b"), Record("/homes/b"))), "Duplicated ID: /homes/b");
   EXPECT_EQ(ReasonOf(903, add(Record("/homes/b"), Record("/homes/x"))), "Path cannot index: /homes/x");
   EXPECT_EQ(State(), "4 2 ");
+}
+
+TEST_F(IndexMgrFolderTest, AChangeKeepsWhatAnotherProcessChangesWhileItWaitsForTheLock) {
+  Restart({Record("/docs/a")});
+  Json::Value result = "as it was", changes;
+  for (const auto& [member, value, code] :
+       {std::tuple("path", "/docs/b", 120), {"group", kAll, 120}, {"audio", "", 120}}) {
+    changes[member] = value;
+    ReasonOf(code, [&] { FolderChange(result, "/docs/a", changes); });
+    changes.clear();
+  }
+  ReasonOf(902, [&] { FolderChange(result, "/docs/b", changes); });
+  ReasonOf(120, [&] { FolderChange(result, "/docs/a", "name"); });
+  EXPECT_EQ(State() + result.asString(), "/docs/a 0 0 as it was");
+  support::ResetCalls(1, EAGAIN);
+  support::OnSleep([] { toFile(Array({Record("/docs/a", "theirs", true)}), kFileIndexFoldersCfgPath); });
+  changes["name"] = "mine";
+  FolderChange(result, "/docs/a", changes);
+  Json::Value expected = Record("/docs/a", "theirs", true), kept;
+  expected["name"] = "mine";
+  FolderGet(kept, "/docs/a");
+  EXPECT_EQ(toString(kept) + toString(result), toString(expected) + toString(expected));
+  EXPECT_EQ(State(), "start watch tell /docs/a 1 0 ");
 }
 
 TEST_F(IndexMgrFolderTest, ABadRequestIsAnErrorAndChangesNothing) {

@@ -1,0 +1,127 @@
+#include "doctor.h"
+
+#include <unistd.h>
+
+#include <algorithm>
+#include <iostream>
+#include <set>
+
+#include "command.h"
+#include "common/error.h"
+#include "common/json.h"
+#include "output.h"
+
+namespace quarrox::ctl {
+namespace doctor {
+namespace {
+
+struct Row {
+  const char* name;
+  Check* check;
+};
+
+// In the order in which remedies are to be followed: what a remedy takes for granted stands before it.
+constexpr Row kChecks[] = {
+    {"caller", CheckCaller},   {"versions", CheckVersions},
+    {"daemons", CheckDaemons}, {"sockets", CheckSockets},
+    {"rights", CheckRights},   {"locks", CheckLocks},
+    {"inotify", CheckInotify}, {"fanotify", CheckFanotify},
+    {"room", CheckRoom},       {"shares.conf", CheckConfiguration},
+    {"shares", CheckShares},   {"folders", CheckFolders},
+    {"index", CheckIndexes},   {"monitor", CheckMonitors},
+    {"flags", CheckFlags},     {"leftovers", CheckLeftovers},
+};
+
+// What keeps a check from its end may keep others from theirs: that is said once.
+Findings Run(const Row& row, Machine& machine, std::set<std::string>& failures) {
+  Findings findings;
+  try {
+    row.check(machine, findings);
+  } catch (const Error& error) {
+    if (failures.insert(error.reason).second) {
+      findings.Wrong("not checked to the end, nor is what needs the same: error " + std::to_string(error.code) + ": " +
+                         error.reason,
+                     "mend that, then run: fileindexctl doctor");
+    }
+  }
+  return findings;
+}
+
+void PrintJson(const char* check, const Finding& finding) {
+  Json::Value object;
+  object["check"] = check;
+  object["ok"] = finding.ok;
+  object["finding"] = finding.text;
+  object["remedy"] = finding.remedy;
+  std::cout << toString(object) << '\n';
+}
+
+void PrintText(const char* check, const Finding& finding) {
+  constexpr size_t kWidth = 13;
+  std::string name = check;
+  name.resize(std::max(kWidth, name.size()), ' ');
+  std::cout << (finding.ok ? "ok     " : "WRONG  ") << name << Visible(finding.text) << '\n';
+  if (!finding.ok) std::cout << std::string(kWidth, ' ') << "remedy " << Visible(finding.remedy) << '\n';
+}
+
+bool IsPlain(char c) {
+  return ('a' <= c && c <= 'z') || ('A' <= c && c <= 'Z') || ('0' <= c && c <= '9') ||
+         std::string("/._-+=:,@%").find(c) != std::string::npos;
+}
+
+}  // namespace
+
+void Findings::WellIfNothing(const std::string& text) {
+  if (list_.empty()) Well(text);
+}
+
+std::string ShellLine(const std::vector<std::string>& words) {
+  std::string line;
+  for (const std::string& word : words) {
+    if (!line.empty()) line += ' ';
+    if (!word.empty() && std::all_of(word.begin(), word.end(), IsPlain)) {
+      line += word;
+      continue;
+    }
+    line += '\'';
+    for (const char c : word) c == '\'' ? line += "'\\''" : line += c;
+    line += '\'';
+  }
+  return line;
+}
+
+std::string ShareCommand(const std::string& verb, const std::string& share, const std::string& operand) {
+  std::vector<std::string> words = {"fileindexctl", "share", verb};
+  if (share.starts_with('-')) words.emplace_back("--");
+  words.push_back(share);
+  if (!operand.empty()) words.push_back(operand);
+  return ShellLine(words);
+}
+
+void CheckCaller(Machine&, Findings& findings) {
+  if (geteuid() == 0) return findings.Well("run by root, who may look at everything");
+  findings.Wrong("not run by root: what only root may look at or talk to is told wrong below",
+                 "sudo fileindexctl doctor");
+}
+
+}  // namespace doctor
+
+int Doctor(const Arguments& arguments) {
+  doctor::Machine machine;
+  std::set<std::string> failures;
+  size_t wrong = 0;
+  for (const doctor::Row& row : doctor::kChecks) {
+    const doctor::Findings findings = doctor::Run(row, machine, failures);
+    for (const doctor::Finding& finding : findings.list()) {
+      arguments.Has("--json") ? doctor::PrintJson(row.name, finding) : doctor::PrintText(row.name, finding);
+      wrong += finding.ok ? 0 : 1;
+    }
+    std::cout.flush();
+  }
+  if (!arguments.Has("--json")) {
+    std::cout << (wrong == 0 ? "all is well" : std::to_string(wrong) + " to be mended, from the top") << '\n';
+  }
+  return wrong == 0 ? kDone : kFailed;
+}
+
+}  // namespace quarrox::ctl
