@@ -37,6 +37,10 @@ const char* MeaningOf(int code) {
   return meaning == meanings.end() ? "" : meaning->second;
 }
 
+bool IsOfTheSystem(int code) {
+  return (quarrox::kErrSystem <= code && code <= quarrox::kErrLockFile) || code == quarrox::kErrEngineReceive;
+}
+
 int Fail(int code, const std::string& reason, bool json) {
   if (json) {
     Json::Value failure;
@@ -49,6 +53,8 @@ int Fail(int code, const std::string& reason, bool json) {
     for (const std::string& text : {std::string(MeaningOf(code)), reason}) {
       if (!text.empty()) std::cerr << ": " << quarrox::ctl::Visible(text);
     }
+    // The system's files and sockets are root's; what is missing then reads like a fault of the system.
+    if (geteuid() != 0 && IsOfTheSystem(code)) std::cerr << " (run it as root?)";
     std::cerr << '\n';
   }
   return quarrox::ctl::kFailed;
