@@ -1,4 +1,6 @@
 // fileindexctl: looks at the full-text index of shared folders and works on it.
+#include <unistd.h>
+
 #include <exception>
 #include <iostream>
 #include <map>
