@@ -14,8 +14,10 @@
 namespace quarrox::notifyd {
 namespace {
 
+// IN_MASK_ADD, because directories are watched again to find out whether they are still in their places: without it the
+// kernel sets the mask of the watch to nothing for a moment, and an event of that moment is gone without a trace.
 constexpr uint32_t kMask = IN_CREATE | IN_DELETE | IN_ATTRIB | IN_CLOSE_WRITE | IN_MOVED_FROM | IN_MOVED_TO |
-                           IN_DELETE_SELF | IN_MOVE_SELF | IN_ONLYDIR | IN_DONT_FOLLOW | IN_EXCL_UNLINK;
+                           IN_DELETE_SELF | IN_MOVE_SELF | IN_ONLYDIR | IN_DONT_FOLLOW | IN_EXCL_UNLINK | IN_MASK_ADD;
 
 struct CloseDir {
   void operator()(DIR* dir) const { closedir(dir); }

@@ -82,8 +82,8 @@ QUARROX_API void FolderReindex(const Json::Value& path_list);
 // --- shares --------------------------------------------------------------------------------------------------------
 
 // Each follows, or leads, a change of a share on the machine. None takes the folder lock: the caller holds it. An empty
-// argument throws Error 120 "Missing ..." before anything else; a share that is asked for its place and is gone throws
-// Error 800.
+// argument throws Error 120 "Missing ..." before anything else, and so does a text that can be no name or path and
+// would be written down; a share that is asked for its place and is gone throws Error 800.
 
 // The share `share_from` now bears the name `share_to`: its folders and its index follow, and the daemon is to look at
 // the move of its directory. The folder list is saved before the engine is told.

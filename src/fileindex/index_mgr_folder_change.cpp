@@ -35,19 +35,6 @@ void notify_setting_changed(const std::string& share_name, bool is_upsert) {
   SendCommandToDaemon("notify_setting_changed", data);
 }
 
-// Refuses a text that is no path of any file system, before it gets into the list, a queue or a call that ends it at
-// its zero byte.
-void RequirePossible(const char* operation, const std::string& path) {
-  if (path.size() >= PATH_MAX) {
-    QUARROX_THROW_IN(operation, "path.size() >= PATH_MAX", kErrBadParameter,
-                     "Path too long: " + std::to_string(path.size()) + " bytes");
-  }
-  if (path.find('\0') != std::string::npos) {
-    QUARROX_THROW_IN(operation, "path.find('\\0') != string::npos", kErrBadParameter,
-                     "Path has a zero byte: " + toString(path));
-  }
-}
-
 // Has the daemon look at what changed in each folder; an entry may be empty.
 void QueueUpdates(const std::vector<FolderPtr>& folders, OpenShares& shares) {
   CustomEvents events(shares);
@@ -214,6 +201,17 @@ void Rebuild(const std::string& share, OpenShares& shares, CustomEvents& events)
 }
 
 }  // namespace
+
+void RequirePossible(const char* operation, const std::string& path) {
+  if (path.size() >= PATH_MAX) {
+    QUARROX_THROW_IN(operation, "path.size() >= PATH_MAX", kErrBadParameter,
+                     "Path too long: " + std::to_string(path.size()) + " bytes");
+  }
+  if (path.find('\0') != std::string::npos) {
+    QUARROX_THROW_IN(operation, "path.find('\\0') != string::npos", kErrBadParameter,
+                     "Path has a zero byte: " + toString(path));
+  }
+}
 
 void FolderAdd(const Json::Value& folder_list, bool updater_mode) {
   FolderUpsert(folder_list, true, updater_mode);

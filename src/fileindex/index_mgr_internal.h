@@ -35,6 +35,25 @@ class MonitorConfigs {
 // the indexing daemon. Failures are logged and not thrown.
 void SetupRelatedServices(bool enable);
 
+// Refuses a text that is no path of any file system, before it gets into the list, a queue or a call that ends it at
+// its zero byte: Error 120, in the name of the operation.
+void RequirePossible(const char* operation, const std::string& path);
+
+// Where the events and the index of a share with the directory `share_path`, a full path, are kept. Throw Error 502.
+std::string QueuePathOf(const std::string& share_path);
+std::string DBPathOf(const std::string& share_path);
+
+// What a share's worker keeps beside the database: with which folders the index was made.
+inline constexpr char kKindsFile[] = "/kinds";
+
+// Takes the configuration of a queue back from the notification daemon. Throws Error 502 in the name of
+// DeleteVEXONotifydCfg.
+void DeleteMonitor(const std::string& queue_path, const std::string& share_name);
+
+// Removes queue, database and what is beside it. Throws Error 502 where the places cannot be told; a file that cannot
+// be removed stays.
+void RemoveShareFiles(const std::string& share_path);
+
 // Removes the queue and the database of the share with the directory `share_path`, a full path, and forgets its status
 // flags. The share need not exist. Throws Error 502 where its places cannot be told from its path, and what changing
 // the status throws; a file that cannot be removed stays.

@@ -1,9 +1,14 @@
 #define QUARROX_LOG_UNIT "index_mgr"
 
+#include <unistd.h>
+
+#include <cerrno>
+
 #include "common/error.h"
 #include "common/log.h"
 #include "common/mutex_lock.h"
 #include "common/sdk/share.h"
+#include "common/strings.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/index_mgr_internal.h"
 #include "fileindex/status_mgr.h"
@@ -24,6 +29,7 @@ using VEXO::VEXONOTIFYD::MonitorQueue;
 
 constexpr char kAppName[] = "fileindex";
 constexpr char kDaemonService[] = "pkg-Quarrox-fileindexd";
+constexpr char kClean[] = "CleanShareIndexData";
 
 // What the notification daemon reports of a watched directory, in its own bits. Single writes (0x02) are left out: the
 // close behind them (0x08) says as much.
@@ -59,15 +65,28 @@ void RemoveTree(const std::string& path) {
   VLIBCExec("/bin/rm", "-rf", path.c_str(), static_cast<const char*>(nullptr));
 }
 
-void DeleteMonitor(const sdk::SDKShare& share) {
-  if (!MonitorQueue::Delete(share.GetQueuePath(), kAppName, MONITOR_QUEUE_TYPE_APPLICATION)) {
-    QUARROX_THROW_IN("DeleteVEXONotifydCfg",
-                     "!MonitorQueue::Delete(share.GetQueuePath(), kAppName, MONITOR_QUEUE_TYPE_APPLICATION)",
-                     kErrSystem, "MonitorQueue::Delete failed, share=" + share.GetName());
-  }
+// A call would take a path with a zero byte for what is before it: the directory of another share.
+bool HasZeroByte(const std::string& path) {
+  return path.find('\0') != std::string::npos;
+}
+
+// What a share's worker keeps beside the database. A directory in which others keep files stays.
+void RemoveWorkerFiles(const std::string& directory) {
+  const int error = errno;
+  for (const char* name : {kKindsFile, "/progress"}) unlink((directory + name).c_str());
+  rmdir(directory.c_str());
+  errno = error;
 }
 
 }  // namespace
+
+void DeleteMonitor(const std::string& queue_path, const std::string& share_name) {
+  if (!MonitorQueue::Delete(queue_path, kAppName, MONITOR_QUEUE_TYPE_APPLICATION)) {
+    QUARROX_THROW_IN("DeleteVEXONotifydCfg",
+                     "!MonitorQueue::Delete(share.GetQueuePath(), kAppName, MONITOR_QUEUE_TYPE_APPLICATION)",
+                     kErrSystem, "MonitorQueue::Delete failed, share=" + share_name);
+  }
+}
 
 const std::vector<std::shared_ptr<Folder>>& MonitorConfigs::FoldersOf(const std::string& share_name) {
   if (!grouped_) {
@@ -93,7 +112,7 @@ void MonitorConfigs::Upsert(const std::string& share_name) {
 }
 
 void MonitorConfigs::Delete(const std::string& share_name) {
-  DeleteMonitor(shares_.Get(share_name));
+  DeleteMonitor(shares_.Get(share_name).GetQueuePath(), share_name);
 }
 
 void UpsertVEXONotifydCfg(const std::string& share_name, FolderMgr& folder_mgr) {
@@ -102,7 +121,7 @@ void UpsertVEXONotifydCfg(const std::string& share_name, FolderMgr& folder_mgr) 
 }
 
 void DeleteVEXONotifydCfg(const std::string& share_name) {
-  DeleteMonitor(sdk::SDKShare(share_name));
+  DeleteMonitor(sdk::SDKShare(share_name).GetQueuePath(), share_name);
 }
 
 void SetupRelatedServices(bool enable) {
@@ -125,19 +144,35 @@ void PrepareServices() {
   SetupRelatedServices(!FolderMgr().GetFolders().empty());
 }
 
-void CleanShareIndexData(const std::string& share_name, const std::string& share_path) {
+std::string QueuePathOf(const std::string& share_path) {
   char path[VEXO_PATH_SIZE] = {};
-  if (0 > FILEIDXQueuePathCompose(share_path.c_str(), path, sizeof(path))) {
-    QUARROX_THROW("0 > FILEIDXQueuePathCompose(share_path.c_str(), path, sizeof(path))", kErrSystem,
-                  "FILEIDXQueuePathCompose failed, share_path=" + share_path);
+  if (HasZeroByte(share_path) || 0 > FILEIDXQueuePathCompose(share_path.c_str(), path, sizeof(path))) {
+    QUARROX_THROW_IN(kClean, "0 > FILEIDXQueuePathCompose(share_path.c_str(), path, sizeof(path))", kErrSystem,
+                     "FILEIDXQueuePathCompose failed, share_path=" + share_path);
   }
-  RemoveTree(path);
-  RemoveTree(std::string(path) + ".tmp");
-  if (0 > FILEIDXDBPathCompose(share_path.c_str(), path, sizeof(path))) {
-    QUARROX_THROW("0 > FILEIDXDBPathCompose(share_path.c_str(), path, sizeof(path))", kErrSystem,
-                  "FILEIDXDBPathCompose failed, share_path=" + share_path);
+  return path;
+}
+
+std::string DBPathOf(const std::string& share_path) {
+  char path[VEXO_PATH_SIZE] = {};
+  if (HasZeroByte(share_path) || 0 > FILEIDXDBPathCompose(share_path.c_str(), path, sizeof(path))) {
+    QUARROX_THROW_IN(kClean, "0 > FILEIDXDBPathCompose(share_path.c_str(), path, sizeof(path))", kErrSystem,
+                     "FILEIDXDBPathCompose failed, share_path=" + share_path);
   }
-  RemoveTree(path);
+  return path;
+}
+
+void RemoveShareFiles(const std::string& share_path) {
+  const std::string queue = QueuePathOf(share_path);
+  RemoveTree(queue);
+  RemoveTree(queue + ".tmp");
+  const std::string db = DBPathOf(share_path);
+  RemoveTree(db);
+  RemoveWorkerFiles(Dirname(db));
+}
+
+void CleanShareIndexData(const std::string& share_name, const std::string& share_path) {
+  RemoveShareFiles(share_path);
   StatusMgr().ClearShareStatus(share_name);
 }
 

@@ -58,6 +58,10 @@ void ResumeShare(const std::string& share_name, MonitorConfigs& monitors) {
 void ShareRename(const std::string& share_from, const std::string& share_to) {
   if (share_from.empty()) QUARROX_THROW("share_from.empty()", kErrBadParameter, "Missing share_from");
   if (share_to.empty()) QUARROX_THROW("share_to.empty()", kErrBadParameter, "Missing share_to");
+  RequirePossible(__func__, share_to);
+  if (share_to.find('/') != std::string::npos) {
+    QUARROX_THROW("share_to.find('/') != string::npos", kErrBadParameter, "No name of a share: " + share_to);
+  }
   const FolderMgr folder_mgr;
   for (const auto& folder : folder_mgr.GetFolders()) {
     if (folder->GetShare() == share_from) folder->SetShare(share_to);
@@ -74,6 +78,7 @@ void ShareMigrate(const std::string& share_name, const std::string& path_from, c
   if (share_name.empty()) QUARROX_THROW("share_name.empty()", kErrBadParameter, "Missing share_name");
   if (path_from.empty()) QUARROX_THROW("path_from.empty()", kErrBadParameter, "Missing path_from");
   if (path_to.empty()) QUARROX_THROW("path_to.empty()", kErrBadParameter, "Missing path_to");
+  for (const std::string& path : {path_from, path_to}) RequirePossible(__func__, path);
   if (!FolderMgr().IsShareIndexed(share_name)) return;
   OpenShares shares;
   elastic::ShareIndexMigrate(share_name, shares.Get(share_name).GetDBPath());

@@ -55,7 +55,6 @@ struct MonitorConfig {
 struct Stray {
   std::string share_path = {};  // the directory that it had
   std::string database = {};    // of its index; empty where there may be none
-  std::string monitor = {};     // the file that has it watched; empty likewise
 };
 
 inline constexpr char kMonitorDirectory[] = "/var/lib/vexonotifyd";

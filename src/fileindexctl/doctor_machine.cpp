@@ -128,7 +128,7 @@ const std::map<std::string, Stray>& Machine::strays() {
     if (queues().count(queue) != 0) continue;
     const std::string place = Dirname(queue);  // VOLUME/@fileindex/NAME
     const std::string name = Basename(place);
-    (*strays_)[name] = {Dirname(Dirname(place)) + '/' + name, "", config.file};
+    (*strays_)[name].share_path = Dirname(Dirname(place)) + "/" + name;
   }
   std::set<std::string> volumes;
   for (const std::string& name : share_names()) {

@@ -16,14 +16,11 @@ namespace {
 // Removes all that there is of a share: at `place`, its directory, which is empty where it has none, and at the place
 // where it was before, which is known by what it left. Empty where there is neither.
 std::string RemoveCommand(const std::string& name, const std::string& place, Machine& machine) {
-  std::string command;
-  const auto add = [&command](const std::string& line) { command += (command.empty() ? "" : " && ") + line; };
-  if (!place.empty()) add(ShareCommand("clear-paused", name, place));
+  const std::string at_place = place.empty() ? "" : ShareCommand("clear-paused", name, place);
   const auto stray = machine.strays().find(name);
-  if (stray == machine.strays().end()) return command;
-  add(ShareCommand("clear-paused", name, stray->second.share_path));
-  if (!stray->second.monitor.empty()) add(ShellLine({"rm", stray->second.monitor}));
-  return command;
+  if (stray == machine.strays().end()) return at_place;
+  const std::string command = ShareCommand("clear-paused", name, stray->second.share_path);
+  return at_place.empty() ? command : at_place + " && " + command;
 }
 
 void ReportGone(const std::string& name, bool is_list_doubtful, Machine& machine, Findings& findings) {

@@ -112,8 +112,10 @@ Found SearchShares(const std::set<std::string>& shares, const Json::Value& qsl, 
     try {
       SearchShare(share, qsl, wanted, found);
     } catch (const Error& error) {
-      if (int{error.code} != kElasticdNoSuchIndex) throw;
-      std::cerr << "fileindexctl: the share " << Visible(share) << " has no index yet, so it is left out\n";
+      const bool is_paused = int{error.code} == kElasticdIndexPaused;
+      if (!is_paused && int{error.code} != kElasticdNoSuchIndex) throw;
+      std::cerr << "fileindexctl: the share " << Visible(share) << (is_paused ? " is paused" : " has no index yet")
+                << ", so it is left out\n";
     }
   }
   std::sort(found.hits.begin(), found.hits.end(),

@@ -4,8 +4,10 @@
 #include "command.h"
 #include "common/json.h"
 #include "common/lock_file.h"
+#include "common/sdk/share.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/index_mgr.h"
+#include "fileindex/index_mgr_move.h"
 #include "output.h"
 
 namespace quarrox::ctl {
@@ -44,6 +46,7 @@ std::string FullPath(const Arguments& arguments, size_t operand) {
 }  // namespace
 
 int ShareRename(const Arguments& arguments) {
+  const sdk::SDKShare exists(arguments.operands()[1]);  // the list is saved before the operation asks for it
   return Change(arguments, "its folders and its index follow", WithoutFolders::kActs,
                 [&](const std::string& share) { fileindex::ShareRename(share, arguments.operands()[1]); });
 }
@@ -75,8 +78,10 @@ int ShareAutoClean(const Arguments& arguments) {
 
 int ShareClearPaused(const Arguments& arguments) {
   const std::string path = FullPath(arguments, 1);
-  return Change(arguments, "its index and its folders are removed", WithoutFolders::kActs,
-                [&](const std::string& share) { fileindex::ShareClearPaused(share, path); });
+  const int status = Change(arguments, "its index and its folders are removed", WithoutFolders::kActs,
+                            [&](const std::string& share) { fileindex::ShareClearPaused(share, path); });
+  fileindex::CleanFormerPlace(path);  // of one that was not paused, also what tells the notification daemon to watch it
+  return status;
 }
 
 int ShareCheckRecycle(const Arguments& arguments) {

@@ -10,13 +10,18 @@
 
 #include <systemd/sd-daemon.h>
 
+#include "common/error.h"
 #include "common/log.h"
+#include "fileindex/folder_mgr.h"
 
 namespace quarrox::fileindexd {
 
 // SIGUSR1 means nothing here; it is blocked for the workers, which inherit that.
 Daemon::Daemon(const std::string& socket_path, bool foreground)
-    : signals_({SIGTERM, SIGINT, SIGCHLD, SIGUSR1}), socket_(socket_path), pool_(foreground) {}
+    : signals_({SIGTERM, SIGINT, SIGCHLD, SIGUSR1}),
+      socket_(socket_path),
+      pool_(foreground),
+      folders_(fileindex::kFileIndexFoldersCfgPath) {}
 
 void Daemon::TakeSignals() {
   for (int signal; (signal = signals_.Take()) != 0;) {
@@ -43,7 +48,18 @@ void Daemon::FollowFolders() {
   }
 }
 
+// Without it, commands still tell of most changes.
+void Daemon::WatchFolders() {
+  try {
+    folders_.Arm();
+  } catch (const Error& error) {
+    errno = 0;
+    QUARROX_LOG_FAILURE("The list of folders cannot be watched, reason: %s", error.reason.c_str());
+  }
+}
+
 void Daemon::LookAtFolders() {
+  WatchFolders();
   try {
     if (indexed_.Refresh()) FollowFolders();
     look_at_ = kNever;
@@ -85,7 +101,8 @@ void Daemon::CarryOut(const Command& command) {
 
 // Clients are answered first, all of them.
 void Daemon::RunOnce() {
-  pollfd fds[] = {{signals_.fd(), POLLIN, 0}, {socket_.fd(), POLLIN, 0}};
+  pollfd fds[2 + QueueWatch::kPollFds] = {{signals_.fd(), POLLIN, 0}, {socket_.fd(), POLLIN, 0}};
+  folders_.FillPollFds(fds + 2);
   PollUntil(fds, std::size(fds), std::min({socket_.Deadline(), pool_.Deadline(), look_at_, stop_at_}));
   TakeSignals();
   if (stop_at_ == kNever) {
@@ -93,6 +110,7 @@ void Daemon::RunOnce() {
     socket_.Process(commands);
     for (const Command& command : commands) CarryOut(command);
   }
+  if (folders_.Reported(fds + 2) && stop_at_ == kNever) look_at_ = Clock::now();
   if (look_at_ <= Clock::now()) LookAtFolders();
   pool_.KeepUp();
 }

@@ -8,6 +8,7 @@
 #include "command.h"
 #include "command_socket.h"
 #include "indexed_shares.h"
+#include "queue_watch.h"
 #include "wait.h"
 #include "worker_pool.h"
 
@@ -31,6 +32,7 @@ class Daemon {
   void RunOnce();
   void CarryOut(const Command& command);
   void Order(const std::string& share, bool run);
+  void WatchFolders();
   void LookAtFolders();
   void FollowFolders();
 
@@ -38,6 +40,7 @@ class Daemon {
   CommandSocket socket_;
   WorkerPool pool_;
   IndexedShares indexed_;
+  QueueWatch folders_;                  // not every change of the list comes with a command
   std::map<std::string, bool> orders_;  // shares whose worker was created or deleted by a command
   Clock::time_point look_at_ = {};      // when the folder list is due, kNever while it has been read
   Backoff look_backoff_;

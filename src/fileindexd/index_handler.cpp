@@ -4,9 +4,12 @@
 
 #include "common/comm.h"
 #include "common/error.h"
+#include "common/lock_file.h"
 #include "common/log.h"
 #include "common/strings.h"
 #include "fileindex/elastic_control.h"
+#include "fileindex/index_mgr.h"
+#include "fileindex/index_mgr_move.h"
 #include "fileindex/status_mgr.h"
 #include "index_handler_compare.h"
 
@@ -30,8 +33,25 @@ struct stat LookAtEngine() {
 
 }  // namespace
 
-bool IndexHandler::HasWork() {
+bool IndexHandler::IsFlagged() const {
   return (StatusMgr().GetShareStatus(scope_.share()) & kReindexFlags) != 0;
+}
+
+// Whether the folders are others than those with which the index was made. Not again where they could not be written
+// down, nor where nothing can be said of them now.
+bool IndexHandler::HaveFoldersChanged() {
+  try {
+    scope_.Read();
+  } catch (const Error&) {
+    errno = 0;
+    return false;
+  }
+  const std::optional<FolderKinds> before = FolderKinds::Load(scope_.kinds_file());
+  return before && *before != scope_.kinds() && committed_kinds_ != scope_.kinds();
+}
+
+bool IndexHandler::HasWork() {
+  return IsFlagged() || HaveFoldersChanged();
 }
 
 void IndexHandler::CheckEngine() const {
@@ -58,8 +78,26 @@ void IndexHandler::Begin(const CheckPoint& check_point) {
     writer_.Forget();
     return true;
   };
-  if (HasWork()) WithIndex([this] { CompareAll(); });
+  former_places_ = fileindex::FindFormerPlaces(scope_.share());
+  if (!former_places_.empty()) WithIndex([this] { FollowMoves(); });
+  if (IsFlagged()) WithIndex([this] { CompareAll(); });
   FollowFolders();
+}
+
+// The share's own directory came from elsewhere, with its folders and their documents. This is seen to first, and not
+// with the other operations: in the fold a lost event, which is likely when directories come and go, takes the place of
+// all. Comparing everything makes up for what is left in the queues of the former places.
+void IndexHandler::FollowMoves() {
+  for (const std::string& place : former_places_) {
+    fileindex::FollowMovedShare(scope_.share(), place);
+    for (const std::string& start : scope_.Starts(scope_.directory())) {
+      const std::string old = place + start.substr(scope_.directory().size());
+      if (LookAt(start).presence == Entry::kThere && elastic::IsDocumentExists(scope_.share(), old)) {
+        elastic::IndexRename(scope_.share(), start, old);
+      }
+    }
+  }
+  CompareAll();
 }
 
 void IndexHandler::FollowFolders() {
@@ -97,12 +135,21 @@ bool IndexHandler::WithIndex(const std::function<void()>& work) {
   return false;
 }
 
+// Who deletes the last folder of a share holds the lock from before its index is gone until the list is saved.
+void IndexHandler::CreateIndex() const {
+  const LockFile lock(fileindex::kFolderLockPath, true);
+  if (!fileindex::FolderMgr().IsShareIndexed(scope_.share())) {
+    throw Error(kErrNoSuchFolder, "The share " + scope_.share() + " has no folder any more");
+  }
+  StatusMgr().SetShareStatus(scope_.share(), kReindexFlags);
+  elastic::ShareIndexCreate(scope_.share());
+}
+
 void IndexHandler::Rebuild() {
   rebuilt_ = true;
-  StatusMgr().SetShareStatus(scope_.share(), kReindexFlags);
   compared_.clear();
   writer_.Forget();
-  elastic::ShareIndexCreate(scope_.share());
+  CreateIndex();
   CompareAll();
 }
 
@@ -140,6 +187,7 @@ void IndexHandler::Delete(const std::string& path) {
 // The documents are moved where that saves reading the files again, and both ends are compared: renames may have come
 // out of the queue in another order than they were made in.
 void IndexHandler::Rename(const std::string& path, const std::string& path_old) {
+  if (path == scope_.directory()) return CompareAll();
   const Entry entry = LookAt(path);
   const Kinds forced = DifferenceOf(path, path_old);
   const bool is_same_kind = GetFileExtension(path, true) == GetFileExtension(path_old, true);
@@ -196,7 +244,9 @@ void IndexHandler::Commit() {
   if (!WithIndex(commit)) commit();
   CheckEngine();
   if (!kinds_before_ || kinds_ != *kinds_before_) kinds_.Save(scope_.kinds_file());
-  if (compared_all_ && HasWork()) StatusMgr().UnsetShareStatus(scope_.share(), kReindexFlags);
+  committed_kinds_ = kinds_;
+  for (const std::string& place : former_places_) fileindex::CleanFormerPlace(place);
+  if (compared_all_ && IsFlagged()) StatusMgr().UnsetShareStatus(scope_.share(), kReindexFlags);
 }
 
 }  // namespace quarrox::fileindexd

@@ -15,6 +15,7 @@
 #include <functional>
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "index_handler_scope.h"
 #include "index_handler_writer.h"
@@ -26,28 +27,33 @@ class IndexHandler final : public OperationHandler {
  public:
   explicit IndexHandler(const std::string& share) : scope_(share), writer_(scope_) {}
 
-  // Where the share's status asks for a reindex.
+  // Where the share's status asks for a reindex, or its folders changed.
   bool HasWork() override;
   void Begin(const CheckPoint& check_point) override;
   void Handle(const fileindex::OP& operation) override;
   void Commit() override;
 
  private:
+  bool IsFlagged() const;
+  bool HaveFoldersChanged();
   void CarryOut(const fileindex::OP& operation);
   void Create(const std::string& path);
   void RefreshAttributes(const std::string& path);
   void Delete(const std::string& path);
   void Rename(const std::string& path, const std::string& path_old);
+  void FollowMoves();
   void Compare(const std::string& path, const Kinds& forced);
   void CompareAll();
   void FollowFolders();
   Kinds DifferenceOf(const std::string& path, const std::string& other) const;
+  void CreateIndex() const;
   void Rebuild();
   bool WithIndex(const std::function<void()>& work);
   void CheckEngine() const;
 
   IndexScope scope_;
   IndexWriter writer_;
+  std::optional<FolderKinds> committed_kinds_;  // of the last pass that was committed
 
   // Of this pass:
   CheckPoint check_point_;
@@ -56,6 +62,7 @@ class IndexHandler final : public OperationHandler {
   FolderKinds kinds_;                        // that it is made with now
   PathSet compared_;                         // where all that was pending before has been met
   PathSet refreshed_;                        // and the kinds were seen to
+  std::vector<std::string> former_places_;   // of the share's directory
   bool compared_all_ = false;
   bool rebuilt_ = false;
 };

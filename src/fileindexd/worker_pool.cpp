@@ -123,9 +123,9 @@ void WorkerPool::WaitForShare(const std::string& share, Worker& worker) const {
   worker.missing_told = true;
   errno = 0;
   QUARROX_LOG_FAILURE(
-      "The share %s is not to be found, so its folders are left out until it is; where it is gone for good, remove "
-      "them from the list of folders",
-      share.c_str());
+      "The share %s is not to be found, so its folders are left out until it is; where it is gone for good: "
+      "fileindexctl share clear-paused %s PATH",
+      share.c_str(), share.c_str());
 }
 
 void WorkerPool::Reap() {

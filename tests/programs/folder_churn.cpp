@@ -1,8 +1,10 @@
-// folder_churn SEED COUNT: adds and deletes /docs/SEED and /music/SEED, and folders that all such processes have in
-// common, COUNT times and with pauses between. Says of each operation in one line what it was ("add", "delete"), which
-// paths it was given, and the code of the Error that it ended with, 0 for none.
+// folder_churn SEED SECONDS: adds and deletes /docs/SEED and /music/SEED, and folders that all such processes have in
+// common, for so long and with pauses between. Says of each operation in one line when it began and ended, in
+// nanoseconds, what it was ("add", "delete"), which paths it was given, and the code of the Error that it ended with, 0
+// for none.
 #include <unistd.h>
 
+#include <chrono>
 #include <cstdlib>
 #include <iostream>
 #include <random>
@@ -23,11 +25,15 @@ int CodeOf(bool add, const Json::Value& folders, const Json::Value& paths) {
   return 0;
 }
 
+int64_t Now() {
+  return std::chrono::nanoseconds(std::chrono::steady_clock::now().time_since_epoch()).count();
+}
+
 }  // namespace
 
 int main(int, char** argv) {
   std::mt19937 random(static_cast<unsigned int>(atol(argv[1])));
-  for (long left = atol(argv[2]); left > 0; --left) {
+  for (const int64_t end = Now() + atol(argv[2]) * 1000000000; Now() < end;) {
     const bool add = random() % 2 == 0;
     Json::Value folders(Json::arrayValue);
     Json::Value paths(Json::arrayValue);
@@ -38,8 +44,9 @@ int main(int, char** argv) {
       folders.append(
           Folder(paths[paths.size() - 1].asString(), "", "", "", true, true, true, true, false, false).GetData());
     }
+    const int64_t start = Now();
     const int code = CodeOf(add, folders, paths);
-    std::cout << (add ? "add" : "delete");
+    std::cout << start << " " << Now() << (add ? " add" : " delete");
     for (const Json::Value& path : paths) std::cout << " " << path.asString();
     std::cout << " " << code << std::endl;
     usleep(static_cast<useconds_t>(random() % 20000));

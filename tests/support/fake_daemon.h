@@ -1,4 +1,5 @@
-// An indexing daemon that takes every command and notes it among the calls of the machine in memory.
+// An indexing daemon that takes every command and notes it among the calls of the machine in memory. Where that call
+// fails, it goes away before it has read all.
 #pragma once
 
 #include <sys/socket.h>
@@ -43,8 +44,13 @@ class FakeDaemon {
       uint32_t length = 0;
       recv(fd, &length, sizeof(length), MSG_WAITALL);
       std::string text(length, '\0');
-      recv(fd, text.data(), length, MSG_WAITALL);
-      FakePlatform::Get().Begin("Daemon", {text.substr(0, length - 1)});  // without the zero
+      recv(fd, text.data(), length - 1, MSG_WAITALL);  // without the zero
+      try {
+        FakePlatform::Get().Begin("Daemon", {text.substr(0, length - 1)});
+      } catch (int) {
+        continue;
+      }
+      recv(fd, text.data(), 1, MSG_WAITALL);
       send(fd, &length, sizeof(length), MSG_NOSIGNAL);
       send(fd, text.data(), length, MSG_NOSIGNAL);
     }

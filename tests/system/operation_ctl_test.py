@@ -1,5 +1,6 @@
 #!/usr/bin/env python3
 """The commands of fileindexctl that change folders and shares, against an engine and a daemon that agree to everything."""
+import json
 import os
 import socket
 import subprocess
@@ -83,6 +84,30 @@ class OperationCommandTest(unittest.TestCase):
             status, [failure] = machine.ctl("call", "FolderGet", text)
             self.assertEqual((status, failure["success"], failure["error"]["code"]), (1, False, 120))
             self.assertIn("argument 1 of FolderGet (path) " + why, failure["error"]["msg"])
+
+    def test_no_operation_does_anything_for_arguments_that_cannot_be(self):
+        good = {"additional": [], "folder_list": [], "path_list": [], "updater_mode": False, "enable": True, "hours": 1, "offset": 0,
+                "limit": 1, "path_from": DOCS, "path_to": DOCS, "share_path": DOCS, "mount_point": machine.SCRATCH, "path": "/docs", "changes": {}}
+        impossible = ["", "docs\0x", "/docs/a\0b", DOCS + "\0x", "docs/a" * 20000]
+        self.assertEqual(machine.ctl("folder", "add", "/docs/a/b")[0], 0)
+        self.requests.clear()
+        find = ["find", "/var/packages", "/var/lib/vexonotifyd", machine.SCRATCH + "/@fileindex", "-type", "f", "-exec", "sha256sum", "{}", "+"]
+        files = subprocess.check_output(find)
+        operations = [line.split() for line in refused("call", "FolderEat").splitlines() if line.startswith("  ")]
+        self.assertEqual(len(operations), 31)
+        for name, *names in operations:
+            for count in {len(names) + 1, len(names) - 1} - {-1}:
+                self.assertIn("call " + name, refused("call", name, *["1"] * count))
+            arguments = [good.get(parameter, "docs") for parameter in names]
+            for place, parameter in enumerate(names):
+                def call(value):
+                    status, [answer] = machine.ctl("call", name, *[json.dumps(value if at == place else a) for at, a in enumerate(arguments)])
+                    return status == 0 or answer["error"]["code"]
+                for value in ({}, 1.5, [1]) if parameter not in ("additional", "changes") else ():
+                    self.assertEqual(call(value), 120, (name, parameter, value))
+                if isinstance(arguments[place], str) and (name, place) not in (("ShareRename", 0), ("ShareClearPaused", 0)):
+                    list(map(call, impossible))  # to a question that is an answer, too
+        self.assertEqual((subprocess.check_output(find).decode(), self.requests), (files.decode(), []))
 
 
 if __name__ == "__main__":

@@ -1,11 +1,15 @@
 // The notification daemon's rules that a running daemon shows only by chance: how a line is written, and what becomes
 // of directories that move between an event and its lookup.
 #include <fcntl.h>
+#include <sys/inotify.h>
+#include <unistd.h>
 
+#include <atomic>
 #include <cstddef>
 #include <filesystem>
 #include <memory>
 #include <string>
+#include <thread>
 #include <utility>
 #include <vector>
 
@@ -16,6 +20,7 @@
 #include "resolver.h"
 #include "scope.h"
 #include "support/temp_dir.h"
+#include "watch_tree.h"
 
 namespace quarrox::notifyd {
 namespace {
@@ -119,6 +124,27 @@ TEST_F(NotifydResolver, AMovedDirectoryIsLookedAtWhereRenamesMayHaveBeenMerged) 
   EXPECT_EQ(Resolve(), (Lines{"256d /b < /a", "256d /c < /b", "128d /b"}));
   for (const std::string ends : {"cb", "bc", "cb", "bd"}) MoveDirectory(ends.substr(0, 1), ends.substr(1));
   EXPECT_EQ(Resolve().back(), "64d /d");
+}
+
+// By another thread, so that the kernel reports while it is asked to watch.
+TEST(NotifydWatchTree, MissesNothingWhereItWatchesAgain) {
+  const support::TempDir dir;
+  fs::create_directory(dir / "sub");
+  support::WriteText(dir / "a", "");
+  const Scope scope(dir.path(), dir / "queue");
+  WatchTree tree(scope);
+  tree.WatchAll();
+  for (int round = 0; round < 20; ++round) {
+    std::atomic<bool> done = false;
+    std::thread other([&] {
+      for (int i = 0; i < 2000; ++i) fs::rename(dir / (i % 2 ? "b" : "a"), dir / (i % 2 ? "a" : "b"));
+      done = true;
+    });
+    while (!done) tree.Watch({tree.root(), "sub"});
+    other.join();
+    std::vector<char> events(1 << 20);
+    EXPECT_EQ(read(tree.fd(), events.data(), events.size()), 4000 * ssize_t{sizeof(inotify_event) + 16}) << round;
+  }
 }
 
 }  // namespace

@@ -48,13 +48,12 @@ class IndexMgrFolderTest : public support::IndexMgrTest {
 };
 
 TEST_F(IndexMgrFolderTest, AStepThatFailsLeavesWhatIsBeforeItDoneAndWhatIsBehindItUndone) {
-  // A step is a call that fails, a daemon that is absent, or a queue that cannot be written.
+  // A step is a call that fails, or a queue that cannot be written.
   const auto expect = [this](const std::vector<Json::Value>& list, const std::function<void()>& operation,
                              const std::vector<std::pair<std::string, std::string>>& steps) {
     for (const auto& [step, state] : steps) {
       Restart(list);
       step[0] == '/' ? void(std::filesystem::create_directories(step)) : world_.Fail(step);
-      if (step == "daemon") daemon_.reset();
       ReasonOf(std::stoi(state), operation);
       EXPECT_EQ(State(), state.substr(state.find(' ') + 1)) << step;
       world_.Heal(step);
@@ -64,19 +63,11 @@ TEST_F(IndexMgrFolderTest, AStepThatFailsLeavesWhatIsBeforeItDoneAndWhatIsBehind
   const auto add = [] { FolderAdd(Array({Record("/docs/a"), Record("/homes/a"), Record("/docs/b")}), false); };
   expect({Record("/homes")}, add,
          {{"VLIBServicectlStart", "0 start create watch watch tell tell /homes /docs/a /homes/a /docs/b 2 1 "},
-          {"DomainSockConnection::Connect", "913 start /homes 0 0 "},
-          {"MonitorQueue::Upsert", "502 start create watch /homes 0 0 "},
-          {"ResetCredentialsByName", "503 start create watch watch /homes 0 0 "},
-          {"daemon", "502 start create watch watch /homes /docs/a /homes/a /docs/b 0 0 "},
           {QueuePath("docs"), "502 start create watch watch tell tell /homes /docs/a /homes/a /docs/b 0R0 "}});
   const auto remove = [] { FolderDelete(Array({"/docs/a", "/homes/a"})); };
   expect({Record("/docs/a"), Record("/homes"), Record("/homes/a", "", true)}, remove,
          {{"none", "0 drop unwatch rm rm rm watch tell tell /homes 0 1 "},
-          {"DomainSockConnection::Connect", "913 /docs/a /homes /homes/a 0 0 "},
-          {"MonitorQueue::Delete", "502 drop unwatch /docs/a /homes /homes/a 0 0 "},
           {"FILEIDXDBPathCompose", "502 drop unwatch rm rm /docs/a /homes /homes/a 0 0 "},
-          {"MonitorQueue::Upsert", "502 drop unwatch rm rm rm watch /docs/a /homes /homes/a 0 0 "},
-          {"daemon", "502 drop unwatch rm rm rm watch /homes 0 0 "},
           {QueuePath("homes"), "502 drop unwatch rm rm rm watch tell tell /homes 0 0R"}});
 }
 

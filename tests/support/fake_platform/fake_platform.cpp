@@ -224,6 +224,7 @@ size_t FakePlatform::CountCalls(const std::string& function) const {
 void FakePlatform::Begin(const std::string& function, const std::vector<std::string>& arguments) {
   std::string texts;
   for (const std::string& argument : arguments) texts += (texts.empty() ? "" : ", ") + argument;
+  if (on_call) on_call(function);
   calls_.push_back(function + "(" + texts + ")");
   const auto fault = faults_.find(function);
   if (fault == faults_.end()) return;

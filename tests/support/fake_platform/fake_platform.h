@@ -9,6 +9,7 @@
 
 #include <cerrno>
 #include <deque>
+#include <functional>
 #include <map>
 #include <string>
 #include <utility>
@@ -74,6 +75,9 @@ class FakePlatform {
     faults_[function] = {error, system_error};
   }
   void Heal(const std::string& function) { faults_.erase(function); }
+
+  // Sees each call before it is made, in the thread that makes it; the int that it throws becomes the call's error.
+  std::function<void(const std::string& function)> on_call = {};
 
   // The calls since Reset or ForgetCalls: "VEXOShareGet(docs)", arguments as texts, records by name, results and
   // buffers left out. Calls about the last error are not among them, nor is reading a list.
