@@ -6,6 +6,7 @@
 // a slash at its end, which is also the identity of the file's document. Thread-safe; nothing is kept between calls.
 #pragma once
 
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -27,7 +28,7 @@ QUARROX_API Json::Value GetFileIndexEventHandler();
 QUARROX_API bool IsDocumentExists(const std::string& share, const std::string& path);
 
 // Makes or replaces the document of the file at a path; `need_meta`: with what is in the file. Throws Error 914 where
-// the file cannot be looked at.
+// the file cannot be looked at or read; errno is then what the system says about it, 0 where that is not the reason.
 QUARROX_API void IndexUpsert(const std::string& share, const std::string& path, bool need_meta);
 
 // Refreshes what the file system says of a file. Throws Error 917 where it has no document, 914 as IndexUpsert.
@@ -39,8 +40,10 @@ QUARROX_API void IndexDelDir(const std::string& share, const std::string& path);
 
 // Moves the document of `old_path` and every document below it. What the engine refuses of the latter is logged and
 // stays where it was. Throws Error 917 where `old_path` has no document, 916 as IsDocumentExists, 120 where a document
-// below lacks its name or parent.
-QUARROX_API void IndexRename(const std::string& share, const std::string& new_path, const std::string& old_path);
+// below lacks its name or parent. `between` is called now and then on the way; what it throws ends the rename
+// there.
+QUARROX_API void IndexRename(const std::string& share, const std::string& new_path, const std::string& old_path,
+                             const std::function<void()>& between = {});
 
 // Makes the accepted changes durable and visible to searches. Where that fails and the share has no room, sets the
 // share's status flag 1 and throws Error 1003 instead.

@@ -1,6 +1,9 @@
 #define QUARROX_LOG_UNIT "elastic_control"
 #include <cxxabi.h>
 
+#include <cerrno>
+#include <new>
+#include <system_error>
 #include <utility>
 
 #include "common/json.h"
@@ -17,6 +20,10 @@ namespace {
 
 // How many documents a rename moves between two commits.
 constexpr Json::ArrayIndex kRenamePage = 10000;
+
+// How many of them with one request where somebody wants to be asked in between: the engine takes a fraction of a
+// second.
+constexpr Json::ArrayIndex kMovesAtOnce = 500;
 
 // {"id", "query": {"qsl": {kind: {"VEXOMDPath": path}}}}
 Json::Value PathQuery(const std::string& index_id, const char* kind, const std::string& path) {
@@ -55,6 +62,19 @@ Json::Value GetByQuery(const char* function, const Json::Value& data) {
   return std::move(res["data"]);
 }
 
+// The errno behind the exception that is being handled, 0 where there is none.
+int SystemError() {
+  try {
+    throw;
+  } catch (const std::system_error& error) {
+    return error.code().category() == std::generic_category() ? error.code().value() : 0;
+  } catch (const std::bad_alloc&) {
+    return ENOMEM;
+  } catch (...) {
+    return 0;
+  }
+}
+
 Json::Value BuildDocument(const std::string& path, bool need_meta) {
   Json::Value options(Json::objectValue);
   options["need_meta"] = need_meta;
@@ -66,7 +86,10 @@ Json::Value BuildDocument(const std::string& path, bool need_meta) {
   } catch (const abi::__forced_unwind&) {
     throw;  // the thread is cancelled
   } catch (...) {
-    throw Error(kErrEngineParse, "Parse failed, path=" + path);
+    const int system_error = SystemError();
+    const Error error(kErrEngineParse, "Parse failed, path=" + path);
+    errno = system_error;
+    throw error;
   }
   return document;
 }
@@ -102,6 +125,20 @@ Json::Value MoveRequest(const std::string& index_id, const Json::Value& hit, con
   document["VEXOMDSearchFileName"] = name;
   document["VEXOMDSearchAncestor"] = new_parent;
   return DocumentRequest("document_set_by_id", index_id, hit["VEXOMDPath"], std::move(document));
+}
+
+void MoveAll(const std::string& index_id, const Json::Value& hits, const std::string& new_path,
+             const std::string& old_path, const std::function<void()>& between) {
+  Json::Value request(Json::objectValue);
+  Json::Value& moves = request["compound"];
+  for (const Json::Value& hit : hits) {
+    moves.append(MoveRequest(index_id, hit, new_path, old_path));
+    if (!between || moves.size() < kMovesAtOnce) continue;
+    SendElasticCommand(request);
+    moves.clear();
+    between();
+  }
+  if (!moves.empty()) SendElasticCommand(request);
 }
 
 }  // namespace
@@ -154,7 +191,8 @@ void IndexGetByPrefixPath(const std::string& index_id, const std::string& path, 
 
 // A full page may have more behind it. It is committed, so that what it moved is no longer found below the old path,
 // and the first page is asked for again.
-void IndexRename(const std::string& share, const std::string& new_path, const std::string& old_path) {
+void IndexRename(const std::string& share, const std::string& new_path, const std::string& old_path,
+                 const std::function<void()>& between) {
   if (!IsDocumentExists(share, old_path)) throw Error(kErrEngineReply);
   const std::string index_id = GetFileIndexID(share);
   SendElasticCommand(DocumentRequest("document_set_by_id", index_id, old_path, RenamedDocument(new_path)));
@@ -167,11 +205,10 @@ void IndexRename(const std::string& share, const std::string& new_path, const st
   for (;;) {
     const Json::Value hits = GetByQuery(__func__, data);
     if (hits.empty()) return;
-    Json::Value request(Json::objectValue);
-    for (const Json::Value& hit : hits) request["compound"].append(MoveRequest(index_id, hit, new_path, old_path));
-    SendElasticCommand(request);
+    MoveAll(index_id, hits, new_path, old_path, between);
     if (hits.size() < kRenamePage) return;
     IndexCommit(share);
+    if (between) between();
   }
 }
 

@@ -139,6 +139,14 @@ size_t OPTree::ProcessOP(const boost::function<void(std::shared_ptr<OP>)>& fn) {
   return entries;
 }
 
+size_t OPTree::Count() const {
+  if (fold_->crashed()) return 1;
+  size_t count = 0;
+  const auto entries = static_cast<OPFold::OpId>(fold_->entries());
+  for (OPFold::OpId id = 1; id <= entries; ++id) count += static_cast<size_t>(fold_->Kind(id) != kOpNone);
+  return count;
+}
+
 void OPTree::TraverseNodeDescendant(const std::shared_ptr<OPNode>& node,
                                     const boost::function<void(std::shared_ptr<OPNode>)>& fn, bool recursive) {
   const std::string prefix = node->GetPath() + "/";

@@ -163,6 +163,9 @@ class QUARROX_API OPTree {
   // included. A crashed queue hands out one operation of kind 7 on the root and returns 1.
   size_t ProcessOP(const boost::function<void(std::shared_ptr<OP>)>& fn);
 
+  // How many it would hand out.
+  size_t Count() const;
+
   // Calls `fn` on every node below `node` (recursive) or on its children, over a snapshot. It looks at the whole tree:
   // for diagnosis and tests, not for a loop.
   void TraverseNodeDescendant(const std::shared_ptr<OPNode>& node,

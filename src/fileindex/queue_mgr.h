@@ -61,6 +61,10 @@ class QUARROX_API QueueMgr {
   // Whether a reindex of `path` or of a directory above it is pending: an event that is nothing but a reindex.
   bool IsFullPathHasReindex(const std::string& path) const;
 
+  // Whether an event of `path` is pending: one on it, or one on a directory above it that concerns everything below, as
+  // in IsFullPathProcessing.
+  bool IsFullPathPending(const std::string& path) const;
+
   const std::string& queue_path() const { return queue_path_; }
   const std::string& queue_path_tmp() const { return queue_path_tmp_; }
 

@@ -8,6 +8,7 @@
 
 #include "fileindex/optree.h"
 #include "fileindex/optree_fold.h"
+#include "fileindex/queue_mgr.h"
 #include "fileindex/queue_mgr_search.h"
 
 namespace quarrox::fileindex {
@@ -33,7 +34,24 @@ void VisitUpwards(const std::string& path, const Visit& visit) {
   while (visit(place) && !place.empty()) place = DirectoryOf(place);
 }
 
+// Whether an event concerns one path.
+bool Concerns(const EventView& event, const std::string& path) {
+  const auto concerns = [&](std::string_view place) {
+    return CanHaveNode(place) && IsAtOrBelow(path, place) && (ConcernsAllBelow(event) || IsAtOrBelow(place, path));
+  };
+  if ((event.event & kEventQueueDamaged) != 0 || concerns(event.path)) return true;
+  return (event.event & kEventRename) != 0 && concerns(event.path_old);
+}
+
 }  // namespace
+
+bool QueueMgr::IsFullPathPending(const std::string& path) const {
+  for (const std::string& queue_path : {queue_path_, queue_path_tmp_}) {
+    QueueSearch queue(queue_path);
+    if (queue.Find([&](const EventView& event) { return Concerns(event, path); })) return true;
+  }
+  return false;
+}
 
 FolderEvents::FolderEvents(const std::string& full_path, const FolderMgr& folders)
     : full_path_(full_path), folders_(folders), is_folder_(folders.IsFullPathHasOwnCfg(full_path)) {}

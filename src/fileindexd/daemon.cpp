@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <iterator>
+#include <utility>
 #include <vector>
 
 #include <systemd/sd-daemon.h>
@@ -17,10 +18,10 @@
 namespace quarrox::fileindexd {
 
 // SIGUSR1 means nothing here; it is blocked for the workers, which inherit that.
-Daemon::Daemon(const std::string& socket_path, bool foreground)
+Daemon::Daemon(const std::string& socket_path, std::vector<std::string> worker_options)
     : signals_({SIGTERM, SIGINT, SIGCHLD, SIGUSR1}),
       socket_(socket_path),
-      pool_(foreground),
+      pool_(std::move(worker_options)),
       folders_(fileindex::kFileIndexFoldersCfgPath) {}
 
 void Daemon::TakeSignals() {

@@ -3,6 +3,7 @@
 
 #include <map>
 #include <string>
+#include <vector>
 
 #include "backoff.h"
 #include "command.h"
@@ -18,8 +19,8 @@ namespace quarrox::fileindexd {
 // Not thread-safe.
 class Daemon {
  public:
-  // Throws Error where another daemon is running or the socket cannot be made. `foreground` is for the workers.
-  Daemon(const std::string& socket_path, bool foreground);
+  // Throws Error where another daemon is running or the socket cannot be made. `worker_options` are for the workers.
+  Daemon(const std::string& socket_path, std::vector<std::string> worker_options);
 
   // Serves until SIGTERM or SIGINT, and ends all workers. Throws Error where the kernel refuses what this stands on.
   void Run();

@@ -1,17 +1,21 @@
 #include "index_handler.h"
 
+#include <algorithm>
 #include <cerrno>
+#include <ctime>
 
 #include "common/comm.h"
 #include "common/error.h"
 #include "common/lock_file.h"
 #include "common/log.h"
+#include "common/sdk/share.h"
 #include "common/strings.h"
 #include "fileindex/elastic_control.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/index_mgr_move.h"
 #include "fileindex/status_mgr.h"
 #include "index_handler_compare.h"
+#include "tree_count.h"
 
 namespace quarrox::fileindexd {
 namespace {
@@ -21,8 +25,12 @@ using fileindex::StatusMgr;
 
 constexpr int kReindexFlags = fileindex::kShareNeedReindex | fileindex::kShareNeedRebuild;
 
-bool IsSameTime(const timespec& a, const timespec& b) {
-  return a.tv_sec == b.tv_sec && a.tv_nsec == b.tv_nsec;
+// A comparison that has written so many documents is a long one: what is left of it is worth counting.
+constexpr uint64_t kDocumentsBeforeCount = 1000;
+
+bool IsSameFile(const struct stat& a, const struct stat& b) {
+  return a.st_dev == b.st_dev && a.st_ino == b.st_ino && a.st_ctim.tv_sec == b.st_ctim.tv_sec &&
+         a.st_ctim.tv_nsec == b.st_ctim.tv_nsec;
 }
 
 struct stat LookAtEngine() {
@@ -33,30 +41,48 @@ struct stat LookAtEngine() {
 
 }  // namespace
 
-bool IndexHandler::IsFlagged() const {
+bool IndexHandler::NeedsReindex() const {
   return (StatusMgr().GetShareStatus(scope_.share()) & kReindexFlags) != 0;
 }
 
-// Whether the folders are others than those with which the index was made. Not again where they could not be written
-// down, nor where nothing can be said of them now.
-bool IndexHandler::HaveFoldersChanged() {
+bool IndexHandler::HasWork() {
+  ReadFailures();
+  return NeedsReindex() || !failures_.Due(time(nullptr)).empty() || HasOtherFolders();
+}
+
+// Whether the index was made with other folders than those of now. The list is read only when it has changed, and no
+// pass is made again where they could not be written down.
+bool IndexHandler::HasOtherFolders() {
+  struct stat list = {};
+  if (stat(fileindex::kFileIndexFoldersCfgPath, &list) != 0) list = {};
+  errno = 0;
+  if (folders_seen_ && IsSameFile(*folders_seen_, list)) return false;
   try {
     scope_.Read();
   } catch (const Error&) {
     errno = 0;
-    return false;
+    return false;  // what cannot be looked at now is looked at when something happens
   }
   const std::optional<FolderKinds> before = FolderKinds::Load(scope_.kinds_file());
-  return before && *before != scope_.kinds() && committed_kinds_ != scope_.kinds();
+  if (before && *before != scope_.kinds() && committed_kinds_ != scope_.kinds()) return true;
+  folders_seen_ = list;
+  return false;
 }
 
-bool IndexHandler::HasWork() {
-  return IsFlagged() || HaveFoldersChanged();
+// What a pass that was not committed has changed is read anew: the engine may have lost it, too.
+void IndexHandler::ReadFailures() {
+  const std::string file = fileindex::IndexFailures::FileOf(sdk::SDKShare(scope_.share()));
+  if (failures_.changed() || failures_.file() != file) failures_ = fileindex::IndexFailures(file);
+}
+
+const Tally& IndexHandler::tally() const {
+  tally_ = writer_.tally();
+  if (to_look_at_) tally_.left = *to_look_at_ - std::min(*to_look_at_, looked_at_);
+  return tally_;
 }
 
 void IndexHandler::CheckEngine() const {
-  const struct stat now = LookAtEngine();
-  if (now.st_dev == engine_.st_dev && now.st_ino == engine_.st_ino && IsSameTime(now.st_ctim, engine_.st_ctim)) return;
+  if (IsSameFile(LookAtEngine(), engine_)) return;
   throw Error(kErrEngineReceive, "The search engine was started anew meanwhile");
 }
 
@@ -65,9 +91,11 @@ void IndexHandler::Begin(const CheckPoint& check_point) {
   refreshed_.clear();
   compared_all_ = false;
   rebuilt_ = false;
-  writer_.Forget();
+  to_look_at_.reset();
+  writer_.Reset();
   engine_ = LookAtEngine();
   scope_.Read();
+  ReadFailures();
   kinds_ = scope_.kinds();
   check_point_ = [this, check_point] {
     const bool may_have_changed = check_point();
@@ -80,8 +108,54 @@ void IndexHandler::Begin(const CheckPoint& check_point) {
   };
   former_places_ = fileindex::FindFormerPlaces(scope_.share());
   if (!former_places_.empty()) WithIndex([this] { FollowMoves(); });
-  if (IsFlagged()) WithIndex([this] { CompareAll(); });
+  if (NeedsReindex()) {
+    WithIndex([this] {
+      Reindex(scope_.directory());
+      compared_all_ = true;
+    });
+  }
   FollowFolders();
+  TryAgain();
+}
+
+// What does not fail once more is no failure any more.
+void IndexHandler::TryAgain() {
+  const int64_t now = time(nullptr);
+  for (const std::string& place : failures_.Due(now)) {
+    const fileindex::IndexFailure* failure = failures_.Find(place);
+    if (failure == nullptr || !failure->IsDue(now)) continue;  // it was met on the way
+    const uint32_t tries = failure->tries;
+    check_point_();
+    WithIndex([&] { Create(scope_.directory() + place); });
+    failure = failures_.Find(place);
+    if (failure != nullptr && failure->tries == tries && failure->IsDue(now)) failures_.Forget(place);
+  }
+}
+
+// A comparison that somebody asked for: what failed is tried again whatever it was.
+void IndexHandler::Reindex(const std::string& path) {
+  std::vector<std::string> failed;
+  if (const std::optional<std::string> place = writer_.PlaceOf(path)) {
+    failed = failures_.AtOrBelow(*place);
+    failures_.ForgetBelow(*place);
+  }
+  for (const std::string& place : failed) writer_.Forget(scope_.directory() + place);
+  if (!failed.empty()) compared_.clear();
+  Compare(path, {});
+  for (const std::string& place : failed) {
+    const std::string full_path = scope_.directory() + place;
+    if (failures_.Find(place) == nullptr && LookAt(full_path).presence != Entry::kGone) Create(full_path);
+  }
+}
+
+// Failures of what is not there, or not to be indexed, any more. The index never knew some of them.
+void IndexHandler::ForgetStrangers(const std::string& path) {
+  const std::optional<std::string> place = writer_.PlaceOf(path);
+  if (!place) return;
+  for (const std::string& failed : failures_.AtOrBelow(*place)) {
+    const std::string full_path = scope_.directory() + failed;
+    if (LookAt(full_path).presence == Entry::kGone || !scope_.Covers(full_path)) failures_.Forget(failed);
+  }
 }
 
 // The share's own directory came from elsewhere, with its folders and their documents. This is seen to first, and not
@@ -93,7 +167,7 @@ void IndexHandler::FollowMoves() {
     for (const std::string& start : scope_.Starts(scope_.directory())) {
       const std::string old = place + start.substr(scope_.directory().size());
       if (LookAt(start).presence == Entry::kThere && elastic::IsDocumentExists(scope_.share(), old)) {
-        elastic::IndexRename(scope_.share(), start, old);
+        writer_.Move(start, old, check_point_);
       }
     }
   }
@@ -149,6 +223,7 @@ void IndexHandler::Rebuild() {
   rebuilt_ = true;
   compared_.clear();
   writer_.Forget();
+  failures_.ForgetBelow("");
   CreateIndex();
   CompareAll();
 }
@@ -156,8 +231,28 @@ void IndexHandler::Rebuild() {
 void IndexHandler::Compare(const std::string& path, const Kinds& forced) {
   if (!forced.Any() && HoldsAtOrAbove(compared_, path)) return;
   if (LookAt(path).presence == Entry::kGone) return writer_.DeleteWithAllBelow(path);
-  IndexComparison(scope_, writer_, check_point_, forced).Run(path);
+  RunComparison(path, forced);
   compared_.insert(path);
+}
+
+// A comparison calls its check point once for each file and directory that it looks at.
+void IndexHandler::RunComparison(const std::string& path, const Kinds& forced) {
+  looked_at_ = 0;
+  const uint64_t done_before = writer_.tally().done;
+  const OperationHandler::CheckPoint check_point = [&] {
+    ++looked_at_;
+    if (!to_look_at_ && writer_.tally().done - done_before >= kDocumentsBeforeCount) CountLooks(path);
+    return check_point_();
+  };
+  IndexComparison(scope_, writer_, check_point, forced).Run(path);
+  to_look_at_.reset();
+  ForgetStrangers(path);
+}
+
+void IndexHandler::CountLooks(const std::string& path) {
+  uint64_t count = 0;
+  for (const std::string& start : scope_.Starts(path)) count += CountTree(start, check_point_);
+  to_look_at_ = count;
 }
 
 void IndexHandler::CompareAll() {
@@ -168,7 +263,7 @@ void IndexHandler::CompareAll() {
 void IndexHandler::Create(const std::string& path) {
   const Entry entry = LookAt(path);
   if (entry.presence == Entry::kGone) return writer_.DeleteWithAllBelow(path);
-  if (entry.presence == Entry::kUnknown) return;
+  if (entry.presence == Entry::kUnknown) return writer_.NoteUnread(path, entry.error);
   if (entry.IsDirectory()) return Compare(path, {});
   if (!scope_.Accepts(path)) return writer_.Delete(path);
   if (!writer_.IsFresh(path)) writer_.Upsert(path);
@@ -194,7 +289,7 @@ void IndexHandler::Rename(const std::string& path, const std::string& path_old) 
   const bool can_move = entry.IsDirectory() || (is_same_kind && !forced.Any());
   if (entry.presence == Entry::kThere && can_move && scope_.Accepts(path) &&
       elastic::IsDocumentExists(scope_.share(), path_old)) {
-    elastic::IndexRename(scope_.share(), path, path_old);
+    writer_.Move(path, path_old, check_point_);
   }
   if (entry.IsDirectory()) {
     writer_.Forget();
@@ -206,7 +301,7 @@ void IndexHandler::Rename(const std::string& path, const std::string& path_old) 
     if (LookAt(end).presence == Entry::kGone) {
       writer_.DeleteWithAllBelow(end);
     } else {
-      IndexComparison(scope_, writer_, check_point_, forced).Run(end);
+      RunComparison(end, forced);
     }
   }
 }
@@ -225,7 +320,7 @@ void IndexHandler::CarryOut(const fileindex::OP& operation) {
     case fileindex::kOpRename:
       return Rename(path, operation.path_old);
     case fileindex::kOpReindex:
-      return Compare(path, {});
+      return Reindex(path);
     case fileindex::kOpQueueCrashed:
       return CompareAll();
     case fileindex::kOpNone:
@@ -243,10 +338,11 @@ void IndexHandler::Commit() {
   const auto commit = [this] { elastic::IndexCommit(scope_.share()); };
   if (!WithIndex(commit)) commit();
   CheckEngine();
+  failures_.Save();
   if (!kinds_before_ || kinds_ != *kinds_before_) kinds_.Save(scope_.kinds_file());
   committed_kinds_ = kinds_;
   for (const std::string& place : former_places_) fileindex::CleanFormerPlace(place);
-  if (compared_all_ && IsFlagged()) StatusMgr().UnsetShareStatus(scope_.share(), kReindexFlags);
+  if (compared_all_ && NeedsReindex()) StatusMgr().UnsetShareStatus(scope_.share(), kReindexFlags);
 }
 
 }  // namespace quarrox::fileindexd

@@ -8,6 +8,9 @@
 // one, and everything in the share's folders is indexed, once a pass. The share's status flags say so until that was
 // committed, so that a worker that dies meanwhile begins again. In the same way the folders with which the index was
 // made are written down with it, and what is indexed otherwise since then is done first.
+//
+// What fails at one path is written down beside the index, when the rest is committed, and keeps nothing else from
+// being done. A pass is also due where something that failed is to be tried again.
 #pragma once
 
 #include <sys/stat.h>
@@ -25,17 +28,26 @@ namespace quarrox::fileindexd {
 
 class IndexHandler final : public OperationHandler {
  public:
-  explicit IndexHandler(const std::string& share) : scope_(share), writer_(scope_) {}
+  explicit IndexHandler(const std::string& share) : scope_(share), writer_(scope_, failures_) {}
 
-  // Where the share's status asks for a reindex, or its folders changed.
+  // Where the share's status asks for a reindex, something is to be tried again, or the folders are others than those
+  // that the index was made with.
   bool HasWork() override;
+  std::optional<int64_t> NextWork() const override { return failures_.NextTry(); }
   void Begin(const CheckPoint& check_point) override;
   void Handle(const fileindex::OP& operation) override;
   void Commit() override;
+  const Tally& tally() const override;
 
  private:
-  bool IsFlagged() const;
-  bool HaveFoldersChanged();
+  bool NeedsReindex() const;
+  bool HasOtherFolders();
+  void ReadFailures();
+  void TryAgain();
+  void Reindex(const std::string& path);
+  void ForgetStrangers(const std::string& path);
+  void RunComparison(const std::string& path, const Kinds& forced);
+  void CountLooks(const std::string& path);
   void CarryOut(const fileindex::OP& operation);
   void Create(const std::string& path);
   void RefreshAttributes(const std::string& path);
@@ -52,8 +64,10 @@ class IndexHandler final : public OperationHandler {
   void CheckEngine() const;
 
   IndexScope scope_;
+  fileindex::IndexFailures failures_;
   IndexWriter writer_;
   std::optional<FolderKinds> committed_kinds_;  // of the last pass that was committed
+  std::optional<struct stat> folders_seen_;  // the folder list that the index was made with
 
   // Of this pass:
   CheckPoint check_point_;
@@ -65,6 +79,9 @@ class IndexHandler final : public OperationHandler {
   std::vector<std::string> former_places_;   // of the share's directory
   bool compared_all_ = false;
   bool rebuilt_ = false;
+  uint64_t looked_at_ = 0;              // by the comparison under way
+  std::optional<uint64_t> to_look_at_;  // by it in all
+  mutable Tally tally_;
 };
 
 }  // namespace quarrox::fileindexd

@@ -112,7 +112,10 @@ void IndexComparison::ReadDirectory(const std::string& directory, std::vector<st
     path.assign(directory).append("/").append(name);
     struct stat info;
     if (fstatat(dirfd(open_directory.get()), name.c_str(), &info, AT_SYMLINK_NOFOLLOW | AT_NO_AUTOMOUNT) != 0) {
-      if (!IsGone(errno)) unread_.insert(path);
+      const int look_error = errno;
+      if (IsGone(look_error)) continue;
+      writer_.NoteUnread(path, look_error);
+      unread_.insert(path);
       continue;
     }
     if (S_ISDIR(info.st_mode)) {
@@ -125,6 +128,7 @@ void IndexComparison::ReadDirectory(const std::string& directory, std::vector<st
   if (error == 0 || IsGone(error)) return;
   errno = error;
   QUARROX_LOG_FAILURE("%.8192s cannot be read; what the index has below it stays", directory.c_str());
+  writer_.NoteUnread(directory, error);
   unread_.insert(directory);
 }
 
@@ -135,7 +139,10 @@ void IndexComparison::Walk(const std::string& start) {
     const std::string path = std::move(pending.back());
     pending.pop_back();
     const Entry entry = LookAt(path);
-    if (entry.presence == Entry::kUnknown) unread_.insert(path);
+    if (entry.presence == Entry::kUnknown) {
+      writer_.NoteUnread(path, entry.error);
+      unread_.insert(path);
+    }
     if (entry.presence != Entry::kThere || !scope_.Accepts(path)) continue;
     Visit(path, entry.info);
     if (entry.IsDirectory()) ReadDirectory(path, pending);

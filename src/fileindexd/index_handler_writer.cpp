@@ -1,6 +1,8 @@
 #include "index_handler_writer.h"
 
+#include <algorithm>
 #include <cerrno>
+#include <cstring>
 #include <utility>
 
 #include "common/comm.h"
@@ -17,6 +19,18 @@ namespace elastic = fileindex::elastic;
 constexpr int kBadArgument = 612;
 constexpr int kNoSuchDocument = 614;
 
+bool ConcernsOnePath(int code) {
+  return code == kErrEngineParse || code == kErrEngineReply || code == kBadArgument || code == kNoSuchDocument;
+}
+
+// Errors that go away without a change of the file: of the disk, of rights further up, of the machine's resources, of
+// another machine that lends the disk.
+bool MaySucceedLater(int error) {
+  constexpr int kPassing[] = {EIO,    EACCES, EPERM,  ENOMEM, EAGAIN,    EBUSY,    EINTR,        EMFILE,
+                              ENFILE, ENOSPC, EDQUOT, ESTALE, ETIMEDOUT, ENOTCONN, EHOSTUNREACH, ECONNRESET};
+  return std::find(std::begin(kPassing), std::end(kPassing), error) != std::end(kPassing);
+}
+
 }  // namespace
 
 Entry LookAt(const std::string& path) {
@@ -24,53 +38,116 @@ Entry LookAt(const std::string& path) {
   if (lstat(path.c_str(), &entry.info) == 0) {
     entry.presence = Entry::kThere;
   } else if (errno != ENOENT && errno != ENOTDIR) {
-    QUARROX_LOG_FAILURE("%.8192s cannot be looked at; what the index has of it stays", path.c_str());
     entry.presence = Entry::kUnknown;
+    entry.error = errno;
+    QUARROX_LOG_FAILURE("%.8192s cannot be looked at; what the index has of it stays", path.c_str());
   }
   errno = 0;
   return entry;
 }
 
-// Throws what is no matter of this one path.
-void IndexWriter::HandleFailure(const Error& error, const std::string& path) {
-  if (error.code != kErrEngineParse && error.code != kBadArgument && error.code != kNoSuchDocument) throw error;
-  if (LookAt(path).presence == Entry::kGone) return Delete(path);
-  errno = 0;
-  QUARROX_LOG_FAILURE("%.8192s is not indexed as it is, code=%d, reason=%.8192s", path.c_str(), error.code,
-                      error.reason.c_str());
+std::optional<std::string> IndexWriter::PlaceOf(const std::string& path) const {
+  if (!IsAtOrBelow(path, scope_.directory())) return std::nullopt;
+  return path.substr(scope_.directory().size());
 }
 
-void IndexWriter::Upsert(const std::string& path) {
+void IndexWriter::Reset() {
+  Forget();
+  tally_ = {};
+}
+
+// What is wrong with the one path that is changed, if something is.
+std::optional<IndexWriter::Failure> IndexWriter::Try(const std::function<void()>& change) const {
+  errno = 0;
   try {
-    elastic::IndexUpsert(scope_.share(), path, scope_.NeedsMeta(path));
-    fresh_.insert(std::hash<std::string>()(path));
+    change();
+    return std::nullopt;
   } catch (const Error& error) {
-    HandleFailure(error, path);
+    const int system_error = error.code == kErrEngineParse ? errno : 0;
+    errno = 0;
+    if (!ConcernsOnePath(error.code)) throw;
+    Failure failure;
+    failure.code = error.code;
+    failure.reason = error.reason;
+    if (system_error != 0) failure.reason.append(", reason=").append(strerror(system_error));
+    failure.may_succeed_later = MaySucceedLater(system_error);
+    return failure;
   }
+}
+
+void IndexWriter::Note(const std::string& path, const Entry& entry, Failure failure) {
+  ++tally_.failed;
+  const std::optional<std::string> place = PlaceOf(path);
+  if (!place) return;
+  if (entry.presence == Entry::kThere) failure.SetFile(entry.info);
+  failures_.Note(*place, std::move(failure));
+}
+
+void IndexWriter::NoteUnread(const std::string& path, int error) {
+  Failure failure;
+  failure.code = kErrSystem;
+  failure.reason = path + " cannot be read, reason=" + strerror(error);
+  failure.may_succeed_later = MaySucceedLater(error);
+  Note(path, {}, std::move(failure));
+}
+
+void IndexWriter::Done(const std::string& path) {
+  ++tally_.done;
+  tally_.path = path;
+}
+
+// Where it fails, it is tried once more without the contents: the name is to be found.
+void IndexWriter::Upsert(const std::string& path) {
+  const std::optional<std::string> place = failures_.empty() ? std::nullopt : PlaceOf(path);
+  const Failure* before = place ? failures_.Find(*place) : nullptr;
+  const bool is_hopeless = before != nullptr && !before->may_succeed_later && before->IsAbout(LookAt(path).info);
+  if (is_hopeless && !before->has_document) return;
+  const bool wants_contents = scope_.NeedsMeta(path) && !is_hopeless;
+  const auto upsert = [&](bool need_meta) {
+    return Try([&] { elastic::IndexUpsert(scope_.share(), path, need_meta); });
+  };
+  std::optional<Failure> failure = upsert(wants_contents);
+  if (failure) {
+    const Entry entry = LookAt(path);
+    if (entry.presence == Entry::kGone) return Delete(path);
+    failure->has_document = wants_contents && !upsert(false);
+    errno = 0;
+    QUARROX_LOG_FAILURE("%.8192s is not indexed as it is, code=%d, reason=%.8192s", path.c_str(), failure->code,
+                        failure->reason.c_str());
+    const bool has_document = failure->has_document;
+    Note(path, entry, *std::move(failure));
+    if (!has_document) return;
+  } else if (before != nullptr && !is_hopeless) {
+    failures_.Forget(*place);
+  }
+  fresh_.insert(std::hash<std::string>()(path));
+  Done(path);
 }
 
 bool IndexWriter::RefreshAttributes(const std::string& path) {
-  try {
-    elastic::IndexAttr(scope_.share(), path);
-  } catch (const Error& error) {
-    if (error.code == kErrEngineReply) return false;
-    HandleFailure(error, path);
-  }
+  const std::optional<std::string> place = failures_.empty() ? std::nullopt : PlaceOf(path);
+  if (place && failures_.Find(*place) != nullptr) return false;
+  if (Try([&] { elastic::IndexAttr(scope_.share(), path); })) return false;
+  Done(path);
   return true;
 }
 
 void IndexWriter::Delete(const std::string& path) {
   Forget(path);
-  try {
-    elastic::IndexDel(scope_.share(), path);
-  } catch (const Error& error) {
-    if (error.code != kNoSuchDocument) throw;
+  const auto failure = Try([&] { elastic::IndexDel(scope_.share(), path); });
+  errno = 0;
+  if (failure && failure->code != kNoSuchDocument) {
+    QUARROX_LOG_FAILURE("%.8192s is not deleted from the index, code=%d, reason=%.8192s", path.c_str(), failure->code,
+                        failure->reason.c_str());
   }
+  if (const std::optional<std::string> place = PlaceOf(path)) failures_.Forget(*place);
+  Done(path);
 }
 
 void IndexWriter::DeleteWithAllBelow(const std::string& path) {
   Delete(path);
   elastic::IndexDelDir(scope_.share(), path);
+  if (const std::optional<std::string> place = PlaceOf(path)) failures_.ForgetBelow(*place);
 }
 
 void IndexWriter::Delete(const std::vector<std::string>& paths) {
@@ -78,6 +155,7 @@ void IndexWriter::Delete(const std::vector<std::string>& paths) {
   Json::Value request(Json::objectValue);
   for (const std::string& path : paths) {
     Forget(path);
+    if (const std::optional<std::string> place = PlaceOf(path)) failures_.Forget(*place);
     Json::Value item(Json::objectValue);
     item["command"] = "document_del_by_id";
     item["data"]["id"] = index_id;
@@ -86,6 +164,21 @@ void IndexWriter::Delete(const std::vector<std::string>& paths) {
   }
   Json::Value response;
   SendRequestImpl(response, request);
+  for (const std::string& path : paths) Done(path);
+}
+
+void IndexWriter::Move(const std::string& path, const std::string& path_old,
+                       const OperationHandler::CheckPoint& check_point) {
+  const auto failure = Try([&] { elastic::IndexRename(scope_.share(), path, path_old, check_point); });
+  if (failure) {
+    QUARROX_LOG_FAILURE("%.8192s is indexed anew, because its documents cannot be moved, code=%d, reason=%.8192s",
+                        path.c_str(), failure->code, failure->reason.c_str());
+    return;
+  }
+  const std::optional<std::string> place = PlaceOf(path);
+  const std::optional<std::string> place_old = PlaceOf(path_old);
+  if (place && place_old) failures_.MoveBelow(*place_old, *place);
+  Done(path);
 }
 
 }  // namespace quarrox::fileindexd

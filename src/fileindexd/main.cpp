@@ -3,6 +3,8 @@
 
 #include <cstdio>
 #include <exception>
+#include <string>
+#include <vector>
 
 #include "common/log.h"
 #include "daemon.h"
@@ -17,11 +19,14 @@ using namespace quarrox::fileindexd;
 
 int Run(const Options& options) {
   if (!options.worker) {
-    Daemon(quarrox::fileindex::kDaemonSocketPath, options.foreground).Run();
+    std::vector<std::string> worker_options;
+    if (options.foreground) worker_options.emplace_back("--foreground");
+    if (options.eager) worker_options.emplace_back("--eager");
+    Daemon(quarrox::fileindex::kDaemonSocketPath, worker_options).Run();
     return 0;
   }
   IndexHandler handler(options.share);
-  return Worker(options.share, handler).Run();
+  return Worker(options.share, handler, options.eager).Run();
 }
 
 int Serve(const Options& options) {

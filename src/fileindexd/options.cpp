@@ -5,10 +5,11 @@
 namespace quarrox::fileindexd {
 namespace {
 
-enum Option { kForeground = 1, kWorker, kHelp };
+enum Option { kForeground = 1, kEager, kWorker, kHelp };
 
 constexpr option kOptions[] = {
     {"foreground", no_argument, nullptr, kForeground},
+    {"eager", no_argument, nullptr, kEager},
     {"worker", required_argument, nullptr, kWorker},
     {"help", no_argument, nullptr, kHelp},
     {nullptr, 0, nullptr, 0},
@@ -18,6 +19,9 @@ void Apply(Options& options, int option) {
   switch (option) {
     case kForeground:
       options.foreground = true;
+      break;
+    case kEager:
+      options.eager = true;
       break;
     case kWorker:
       options.worker = true;
@@ -34,12 +38,13 @@ void Apply(Options& options, int option) {
 }  // namespace
 
 const char* const kUsage =
-    "Usage: fileindexd [--foreground]\n"
+    "Usage: fileindexd [--foreground] [--eager]\n"
     "\n"
     "Drains the event queues of all indexed shares, one process a share, until SIGTERM. It never leaves the "
     "foreground.\n"
     "\n"
     "  --foreground     write the log to standard error, too\n"
+    "  --eager          work as fast as the machine can; else the others on it come first\n"
     "  --worker SHARE   serve this one share; so the daemon starts its workers\n"
     "  --help           show this text\n";
 

@@ -4,6 +4,7 @@
 #include <signal.h>
 #include <sys/timerfd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <iterator>
 #include <utility>
@@ -34,10 +35,19 @@ int64_t Now() {
   return std::chrono::system_clock::to_time_t(std::chrono::system_clock::now());
 }
 
+// By the clock that people set, though not further away than what is tried again ever is: it may be set back.
+Clock::time_point DeadlineOf(std::optional<int64_t> time) {
+  constexpr int64_t kLongest = 3600;
+  if (!time) return kNever;
+  return Clock::now() + std::chrono::seconds(std::clamp<int64_t>(*time - Now(), 1, kLongest));
+}
+
 }  // namespace
 
-Worker::Worker(std::string share, OperationHandler& handler)
-    : share_(std::move(share)), handler_(handler), signals_({SIGTERM, SIGINT, SIGUSR1}) {}
+Worker::Worker(std::string share, OperationHandler& handler, bool eager)
+    : share_(std::move(share)), handler_(handler), signals_({SIGTERM, SIGINT, SIGUSR1}), pacer_(!eager) {
+  if (!eager) BecomeCalm();
+}
 
 // True where there was one.
 bool Worker::TakeSignals() {
@@ -55,8 +65,10 @@ void Worker::LookAtPause() {
 // A share may have moved to another place since the last look, or be gone.
 void Worker::OpenQueue() {
   try {
-    const std::string path = sdk::SDKShare(share_).GetQueuePath();
+    const sdk::SDKShare share(share_);
+    const std::string path = share.GetQueuePath();
     if (!watch_ || watch_->path() != path) watch_.emplace(path);
+    progress_.Open(fileindex::IndexProgress::FileOf(share));
   } catch (const Error& error) {
     if (error.code == kErrNoSuchShare) throw NoShare();
     throw;
@@ -84,10 +96,21 @@ void Worker::Arm() {
 
 // Where a pass is to be left, this leaves it.
 bool Worker::IsToldToLookAgain() {
+  pacer_.Pace(signals_.fd());
+  if (progress_.IsDue()) progress_.Update(handler_.tally(), operations_);
   if (!TakeSignals()) return false;
   if (stopping_) throw Interrupted();
   LookAtPause();
   return true;
+}
+
+void Worker::HandleQueue(const QueueMgr& queue) {
+  const std::shared_ptr<fileindex::OPTree> operations = queue.GetOPTreeTmp();
+  operations_ = operations->Count();
+  operations->ProcessOP([this](const std::shared_ptr<fileindex::OP>& operation) {
+    --*operations_;
+    handler_.Handle(*operation);
+  });
 }
 
 // False where nothing is pending.
@@ -97,12 +120,13 @@ bool Worker::Pass() {
   // A pass that did not end leaves its ".tmp", and perhaps no queue beside it.
   const bool is_pending = queue.PrepareTmpQueue() || IsFileExist(path + ".tmp");
   if (!is_pending && !handler_.HasWork()) return false;
+  progress_.Work();
+  operations_.reset();
   handler_.Begin([this] { return IsToldToLookAgain(); });
-  if (is_pending) {
-    queue.ProcessOP([this](const std::shared_ptr<fileindex::OP>& operation) { handler_.Handle(*operation); }, true);
-  }
+  if (is_pending) HandleQueue(queue);
   handler_.Commit();
   if (is_pending && queue.DeleteTmp() != 0 && errno != ENOENT) FailCall("unlink " + path + ".tmp");
+  progress_.Committed();
   return true;
 }
 
@@ -113,6 +137,7 @@ Worker::Outcome Worker::TryDrain() {
     LookAtPause();
     OpenQueue();
     Arm();
+    failure_ = "The queue cannot be watched, so it is looked at now and then";
     if (!Pass()) return armed_ ? Outcome::kDrained : Outcome::kFailed;
     backoff_.Reset();
   }
@@ -129,22 +154,25 @@ Worker::Outcome Worker::Drain() {
     return Outcome::kNoShare;
   } catch (const Error& error) {
     errno = 0;
+    failure_ = error.reason;
     QUARROX_LOG_FAILURE("A pass over the queue of share %s failed, code=%d, reason=%.8192s", share_.c_str(), error.code,
                         error.reason.c_str());
   } catch (const std::exception& error) {
     errno = 0;
+    failure_ = error.what();
     QUARROX_LOG_FAILURE("A pass over the queue of share %s failed, reason=%.8192s", share_.c_str(), error.what());
   }
   return Outcome::kFailed;
 }
 
 void Worker::WaitForQueue() {
+  const Clock::time_point next_work = DeadlineOf(handler_.NextWork());
   pollfd fds[1 + QueueWatch::kPollFds];
   do {
     fds[0] = {signals_.fd(), POLLIN, 0};
     watch_->FillPollFds(fds + 1);
-    PollUntil(fds, std::size(fds), kNever);
-    if (fds[0].revents != 0) return;
+    PollUntil(fds, std::size(fds), next_work);
+    if (fds[0].revents != 0 || Clock::now() >= next_work) return;
   } while (!watch_->Reported(fds + 1));
   PollUntil(fds, 1, Clock::now() + kBurst);
 }
@@ -171,12 +199,15 @@ int Worker::Run() {
     switch (Drain()) {
       case Outcome::kDrained:
         backoff_.Reset();
+        progress_.Idle(handler_.tally());
         WaitForQueue();
         break;
       case Outcome::kPaused:
+        progress_.Wait("Indexing is paused", handler_.tally());
         WaitForResume();
         break;
       case Outcome::kFailed:
+        progress_.Wait(failure_, handler_.tally());
         WaitToTryAgain();
         break;
       case Outcome::kNoShare:

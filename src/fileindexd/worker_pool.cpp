@@ -78,12 +78,13 @@ bool WorkerPool::Has(const std::string& share) const {
 
 void WorkerPool::Spawn(const std::string& share, Worker& worker) const {
   const pid_t parent = getpid();
-  std::string words[] = {"fileindexd", "--worker", share, "--foreground"};
-  char* arguments[std::size(words) + 1] = {};
-  const size_t count = std::size(words) - (foreground_ ? 0 : 1);
-  for (size_t i = 0; i < count; ++i) arguments[i] = words[i].data();
+  std::vector<std::string> words = {"fileindexd", "--worker", share};
+  words.insert(words.end(), options_.begin(), options_.end());
+  std::vector<char*> arguments;
+  for (std::string& word : words) arguments.push_back(word.data());
+  arguments.push_back(nullptr);
   const pid_t pid = fork();
-  if (pid == 0) Become(parent, arguments);
+  if (pid == 0) Become(parent, arguments.data());
   worker.start_at = kNever;
   if (pid < 0) return StartLater(share, worker, std::string("cannot be started, reason=") + strerror(errno));
   worker.pid = pid;

@@ -8,6 +8,7 @@
 
 #include <map>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "backoff.h"
@@ -29,8 +30,8 @@ class WorkerPool {
   // Processes made by one call of KeepUp(), so that clients need not wait for hundreds of them.
   static constexpr int kSpawnsAtOnce = 4;
 
-  // `foreground` is passed on to the workers.
-  explicit WorkerPool(bool foreground) : foreground_(foreground) {}
+  // Words of the command line of each worker.
+  explicit WorkerPool(std::vector<std::string> options) : options_(std::move(options)) {}
 
   // Starts a share's process unless it runs, also where it waits to be started again or its share was not found.
   void Start(const std::string& share);
@@ -70,7 +71,7 @@ class WorkerPool {
   void WaitForShare(const std::string& share, Worker& worker) const;
   void StartLater(const std::string& share, Worker& worker, const std::string& why) const;
 
-  const bool foreground_;
+  const std::vector<std::string> options_;
   std::map<std::string, Worker> workers_;
 };
 

@@ -1,8 +1,12 @@
 #!/usr/bin/env python3
-"""From a change on the disk to the answer of a search, with the real daemons VEXOELASTICD, VEXONOTIFYD and FILEINDEXD."""
+"""From a change on the disk to the answer of a search, with the real daemons VEXOELASTICD, VEXONOTIFYD and FILEINDEXD.
+
+FAILING_READS    a library with which files and directories named bad* cannot be read while /run/bad_disk is there
+"""
 import json
 import os
 import pathlib
+import re
 import shutil
 import subprocess
 import time
@@ -11,7 +15,7 @@ import unittest
 import private_machine as machine
 
 ETC, VOLUME = pathlib.Path("/var/packages/Quarrox/etc"), pathlib.Path(machine.SCRATCH, "v")
-DOCS, QUEUE, LOG = (VOLUME / place for place in ("docs", "@fileindex/docs/queue", "../log"))
+DOCS, QUEUE, FAILURES, LOG = (VOLUME / p for p in ("docs", "@fileindex/docs/queue", "@fileindex/docs/failures", "../log"))
 KINDS = {"document": True, "audio": True, "video": True, "photo": False}
 
 
@@ -28,7 +32,8 @@ class SearchTest(unittest.TestCase):
             time.sleep(0.05)
 
     def start(self, name, *arguments):
-        process = subprocess.Popen([os.environ[name], *arguments], stderr=self.log)
+        preload = {"LD_PRELOAD": os.environ["FAILING_READS"]} if name == "FILEINDEXD" else {}
+        process = subprocess.Popen([os.environ[name], *arguments], stderr=self.log, env={**os.environ, **preload})
         self.addCleanup(lambda: (process.kill(), process.wait()))
         return process
 
@@ -52,7 +57,7 @@ class SearchTest(unittest.TestCase):
         self.log = self.enterContext(open(LOG, "w"))
         self.start_engine()
         self.start("VEXONOTIFYD", "--watch", DOCS, "--queue", QUEUE)
-        self.start("FILEINDEXD", "--foreground")
+        self.daemon = self.start("FILEINDEXD", "--foreground")
         while "watching" not in LOG.read_text():
             time.sleep(0.01)
         (DOCS / "in/first.txt").write_text("alpha")
@@ -91,6 +96,29 @@ class SearchTest(unittest.TestCase):
         self.tell(event=0x200)  # events were lost, the one about the folder, too
         self.until_found([], "alpha")
         self.assertEqual(found("txt", "--name"), ["in/first.txt", "out.txt"])
+
+    def test_what_cannot_be_read_is_found_by_its_name_and_tried_again_when_it_is_time(self):
+        machine.write("/run/bad_disk")
+        (DOCS / "in/baddir").mkdir()
+        for name in ("in/bad.txt", "in/good.txt"):
+            machine.write(DOCS / name, "beta")
+        self.until_found(["in/good.txt"], "beta")
+        self.until_found(["in/bad.txt", "in/baddir"], "bad", "--name")
+        while not FAILURES.exists() or any(name not in FAILURES.read_text() for name in ("bad.txt", "baddir")):
+            time.sleep(0.01)
+        for name, code in ("in/bad.txt", 914), ("in/baddir", 502):
+            answer = machine.ctl("explain", str(DOCS / name))[1][0]
+            failure = answer["failure"]
+            pause = 60 << failure["tries"] - 1
+            self.assertEqual((answer["indexed"], failure["code"], failure["next_try"] - failure["tried"]), (True, code, pause))
+            self.assertIn("Input/output error", failure["reason"])
+        (self.daemon.kill(), self.daemon.wait())
+        os.unlink("/run/bad_disk")
+        machine.write(FAILURES, re.sub('"tried":[0-9]+', '"tried":1', FAILURES.read_text()))
+        self.start("FILEINDEXD", "--foreground")  # nothing tells it of the files
+        self.until_found(["in/bad.txt", "in/good.txt"], "beta")
+        while "bad" in FAILURES.read_text():
+            time.sleep(0.01)
 
     def test_nothing_is_lost_when_the_engine_is_killed_in_a_pass_or_its_index_is_gone(self):
         names = ["in/many/%d/%d.txt" % (i % 20, i) for i in range(4000)]

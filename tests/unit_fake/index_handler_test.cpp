@@ -21,8 +21,9 @@ struct IndexHandlerTest : support::EngineTest {
   void SetUp() override {
     EngineTest::SetUp();
     if (IsSkipped()) return;
-    for (const std::string& place : {std::string("/var/packages"), docs_}) fs::remove_all(place);
-    fs::create_directories(docs_ + "in/sub");
+    const std::string beside = docs_ + "../@fileindex/docs";
+    for (const std::string& place : {std::string("/var/packages"), beside, docs_}) fs::remove_all(place);
+    for (const std::string& place : {docs_ + "in/sub", beside}) fs::create_directories(place);
     for (const char* name : {"in", "in/sub", "in/a.txt", "in/b.txt", "in/c.jpg", "out.txt"}) {
       if (!fs::exists(docs_ + name)) std::ofstream(docs_ + name) << name;
       world_.documents[docs_ + name]["VEXOMDFSName"] = name;
@@ -91,6 +92,42 @@ TEST_F(IndexHandlerTest, WhatIsOnTheDiskDecidesWhateverAnOperationSays) {
     handler_.Begin(go_on_);
     EXPECT_EQ(Handle(op, name, answers, photo), expected) << op << name;
   }
+}
+
+TEST_F(IndexHandlerTest, WhatTheEngineRefusesForGoodIsTriedAgainOnlyWhenItChangesOrAReindexAsks) {
+  const std::string refused = R"({"success":false,"error":{"code":612,"msg":"m"}})", a = "upsert in/a.txt, ";
+  const std::deque<std::string> both = {refused, refused}, known = {Found(Hit("in")), Found(Hit("in/a.txt"))};
+  handler_.Begin(go_on_);
+  EXPECT_EQ(Handle(kOpCreate, "in/a.txt", both), a + a);  // the second without the contents
+  EXPECT_EQ(Handle(kOpCreate, "in/a.txt"), "");
+  handler_.Begin(go_on_);  // nothing was committed
+  EXPECT_EQ(Handle(kOpCreate, "in/a.txt", {refused}), a + a);
+  handler_.Commit();
+  Sent();
+  handler_.Begin(go_on_);
+  EXPECT_EQ(Handle(kOpCreate, "in/a.txt"), a);  // the index may have lost it
+  EXPECT_NE(Handle(kOpReindex, "in", known).find(a), std::string::npos);
+  handler_.Begin(go_on_);
+  Handle(kOpCreate, "in/a.txt", both);
+  std::ofstream(docs_ + "in/a.txt") << "other";
+  EXPECT_EQ(Handle(kOpCreate, "in/a.txt", both), a + a);
+}
+
+TEST_F(IndexHandlerTest, AFolderListThatChangedIsFollowedWithoutAnyEvent) {
+  handler_.Begin(go_on_);
+  handler_.Commit();
+  FolderMgr folders;
+  std::shared_ptr<Folder> diff, in(new Folder("/docs/in", "n", "", "", true, true, true, true, true, true));
+  folders.Upsert(diff, in);
+  folders.Save();
+  IndexHandler next("docs");
+  EXPECT_TRUE(next.HasWork());
+  Sent();
+  world_.engine_answers = {Found(""), Found(Hit("in/a.txt") + Hit("in/b.txt") + Hit("in/c.jpg") + Hit("in/sub"))};
+  next.Begin(go_on_);
+  next.Commit();
+  EXPECT_EQ(Sent(), "commit, get in, get in/, upsert in, upsert in/c.jpg, ");
+  EXPECT_FALSE(next.HasWork());
 }
 
 TEST_F(IndexHandlerTest, AShareWhoseDiskGoesAwayKeepsItsIndexAndASignalEndsAWalk) {
