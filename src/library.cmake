@@ -24,7 +24,9 @@ install(TARGETS fileindex EXPORT fileindexTargets LIBRARY DESTINATION ${CMAKE_IN
 install(DIRECTORY include/common DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/quarrox FILES_MATCHING PATTERN "*.h")
 install(FILES fileindex/optree.h fileindex/util.h fileindex/folder.h fileindex/folder_mgr.h fileindex/queue_mgr.h
               fileindex/communication.h fileindex/status_mgr.h fileindex/notices.h fileindex/elastic_control.h
-              fileindex/custom_events.h fileindex/index_mgr.h fileindex/index_progress.h fileindex/index_failures.h DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/quarrox/fileindex)
+              fileindex/custom_events.h fileindex/index_mgr.h fileindex/index_progress.h fileindex/index_failures.h
+              fileindex/folder_kinds.h fileindex/index_scope.h fileindex/index_compare.h
+              DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/quarrox/fileindex)
 install(EXPORT fileindexTargets NAMESPACE fileindex:: DESTINATION ${CMAKE_INSTALL_LIBDIR}/cmake/fileindex)
 include(CMakePackageConfigHelpers)
 write_basic_package_version_file(${CMAKE_CURRENT_BINARY_DIR}/fileindexConfigVersion.cmake COMPATIBILITY SameMajorVersion)

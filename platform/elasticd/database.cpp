@@ -29,6 +29,8 @@ constexpr uint64_t kCountedHits = 100;
   const std::string text = error.get_description();
   const char* system = error.get_error_string();
   for (const int no_room : {ENOSPC, EDQUOT, EFBIG}) {
+    // An error that another one followed is told in its text alone.
+    if (text.find(strerror(no_room)) != std::string::npos) throw Error(kNoRoom, text);
     if (system != nullptr && strcmp(system, strerror(no_room)) == 0) throw Error(kNoRoom, text);
   }
   if (strcmp(error.get_type(), "DatabaseModifiedError") == 0) throw OutdatedReader(text);
@@ -300,6 +302,28 @@ void Writer::ForEachKey(const std::string& prefix, const std::function<bool(cons
 
 std::string Writer::Place(DocumentId id) const {
   return Guard([&] { return impl_->database.get_document(id, Xapian::DOC_ASSUME_VALID).get_value(kPlaceSlot); });
+}
+
+void Writer::ForEachPlace(const std::function<bool(DocumentId id, const std::string& place)>& take) const {
+  Guard([&] {
+    const Xapian::ValueIterator end = impl_->database.valuestream_end(kPlaceSlot);
+    for (Xapian::ValueIterator at = impl_->database.valuestream_begin(kPlaceSlot); at != end; ++at) {
+      if (!take(at.get_docid(), *at)) return;
+    }
+  });
+}
+
+std::vector<double> Writer::Numbers(unsigned int field, const std::vector<DocumentId>& ids) const {
+  std::vector<double> numbers(ids.size(), std::numeric_limits<double>::quiet_NaN());
+  Guard([&] {
+    const Xapian::ValueIterator end = impl_->database.valuestream_end(kFirstNumberSlot + field);
+    Xapian::ValueIterator at = impl_->database.valuestream_begin(kFirstNumberSlot + field);
+    for (size_t i = 0; i < ids.size() && at != end; ++i) {
+      at.skip_to(ids[i]);
+      if (at != end && at.get_docid() == ids[i]) numbers[i] = Xapian::sortable_unserialise(*at);
+    }
+  });
+  return numbers;
 }
 
 void Writer::Set(const std::string& key, const std::string& value) {

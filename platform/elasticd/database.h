@@ -67,6 +67,12 @@ class Writer final : public Store {
   void ForEachKey(const std::string& prefix, const std::function<bool(const std::string&)>& take) const override;
   std::string Place(DocumentId id) const override;
 
+  // Hands out each document with its place, in order of identifiers, until `take` returns false.
+  void ForEachPlace(const std::function<bool(DocumentId id, const std::string& place)>& take) const;
+
+  // The numbers that some documents, in order of identifiers, have in a field; NaN for those that have none.
+  std::vector<double> Numbers(unsigned int field, const std::vector<DocumentId>& ids) const;
+
   void Set(const std::string& key, const std::string& value);
 
   // The identifier that the next Add() gives its document.

@@ -8,6 +8,7 @@
 #include "common/log.h"
 #include "document_change.h"
 #include "error_code.h"
+#include "index_listing.h"
 #include "index_searches.h"
 #include "query_parser.h"
 
@@ -198,7 +199,8 @@ void Index::CloseNow() {
 
 void Index::Create() {
   Administer([this] {
-    if (files_.Exists()) return;
+    if (files_.Exists() && state_ != State::kGone) return;
+    if (files_.Exists()) files_.Delete();  // what an attempt left that failed
     files_.MakeDirectory();
     files_.RemoveMark();
     open_.reset();
@@ -443,24 +445,28 @@ void Index::Find(const SearchRequest& request, Answer& answer) {
 // The number of all hits is told where all were looked at.
 void Index::ShowByPath(const std::string& path, bool is_prefix, const SearchRequest& request, Answer& answer) {
   if (!request.sort.empty()) throw Error(kBadQuery, "A search by path is not sorted by a field");
+  const std::vector<std::string>& names = request.load_fields;
+  const bool is_listing = Listing::CanShow(mapping_, path_fields_, names);
   Run(Access::kLook, [&](Open& open) {
     answer.Append("[");
+    Listing listing(open.writer, mapping_, path_fields_, names, answer);
     bool first = true;
     uint64_t count = 0;
     bool more = false;
-    const auto show = [&](DocumentId id, const std::string& directory, const std::string& base) {
-      more = count >= request.from && count - request.from >= request.size;
-      if (more) return false;
-      if (count++ < request.from) return true;
-      AppendElement(answer, first,
-                    ShowFields(open.writer, mapping_, path_fields_, id, directory, base, request.load_fields));
-      return true;
-    };
-    if (is_prefix) {
-      open.places.ForEach(path, show);
-    } else if (const DocumentId id = path.empty() ? 0 : open.places.Find(path)) {
-      show(id, path.substr(0, path.rfind('/')), Base(path));
-    }
+    ForEachAt(open.writer, open.places, path, is_prefix, is_listing,
+              [&](DocumentId id, const std::string& directory, const std::string& base) {
+                more = count >= request.from && count - request.from >= request.size;
+                if (more) return false;
+                if (count++ < request.from) return true;
+                if (is_listing) {
+                  listing.Add(id, directory, base);
+                } else {
+                  AppendElement(answer, first,
+                                ShowFields(open.writer, mapping_, path_fields_, id, directory, base, names));
+                }
+                return true;
+              });
+    listing.Finish();
     answer.Append(more ? "]" : "],\"total\":" + std::to_string(count));
   });
 }

@@ -43,8 +43,10 @@ void RequirePossible(const char* operation, const std::string& path);
 std::string QueuePathOf(const std::string& share_path);
 std::string DBPathOf(const std::string& share_path);
 
-// What a share's worker keeps beside the database: with which folders the index was made.
-inline constexpr char kKindsFile[] = "/kinds";
+// What a share's worker keeps beside the database. With which folders the index was made and what could not be indexed
+// stays true where the share moves.
+inline constexpr const char* kMovableWorkerFiles[] = {"/kinds", "/failures"};
+inline constexpr const char* kOtherWorkerFiles[] = {"/own_disk", "/progress"};
 
 // Takes the configuration of a queue back from the notification daemon. Throws Error 502 in the name of
 // DeleteVEXONotifydCfg.

@@ -70,10 +70,12 @@ void FollowMovedShare(const std::string& share_name, const std::string& path_old
   FolderMgr folder_mgr;
   if (IsWatched(share_name, folder_mgr)) UpsertVEXONotifydCfg(share_name, folder_mgr);
   if (IsIndexedShareAt(path_old, folder_mgr)) return;
-  const std::string from = Dirname(DBPathOf(path_old)) + kKindsFile;
-  const std::string to = Dirname(sdk::SDKShare(share_name).GetDBPath()) + kKindsFile;
-  if (rename(from.c_str(), to.c_str()) != 0 && errno != ENOENT) {
-    QUARROX_LOG_FAILURE("%s was not moved; a change of folders that nobody told of would be missed", from.c_str());
+  const std::string from = Dirname(DBPathOf(path_old));
+  const std::string to = Dirname(sdk::SDKShare(share_name).GetDBPath());
+  for (const char* name : kMovableWorkerFiles) {
+    if (rename((from + name).c_str(), (to + name).c_str()) != 0 && errno != ENOENT) {
+      QUARROX_LOG_FAILURE("%s%s was not moved; the share's index lacks what it says", from.c_str(), name);
+    }
   }
   errno = 0;
 }

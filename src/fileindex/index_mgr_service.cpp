@@ -73,7 +73,8 @@ bool HasZeroByte(const std::string& path) {
 // What a share's worker keeps beside the database. A directory in which others keep files stays.
 void RemoveWorkerFiles(const std::string& directory) {
   const int error = errno;
-  for (const char* name : {kKindsFile, "/failures", "/progress"}) unlink((directory + name).c_str());
+  for (const char* name : kMovableWorkerFiles) unlink((directory + name).c_str());
+  for (const char* name : kOtherWorkerFiles) unlink((directory + name).c_str());
   rmdir(directory.c_str());
   errno = error;
 }

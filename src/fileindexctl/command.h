@@ -59,6 +59,7 @@ std::string NameOf(const Command& command);
 // Every command, in the order of the help.
 const std::vector<Command>& Commands();
 
+int Audit(const Arguments& arguments);
 int Call(const Arguments& arguments);
 int Doctor(const Arguments& arguments);
 int FolderAdd(const Arguments& arguments);

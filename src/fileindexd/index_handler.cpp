@@ -1,5 +1,7 @@
 #include "index_handler.h"
 
+#include <fcntl.h>
+
 #include <algorithm>
 #include <cerrno>
 #include <ctime>
@@ -11,22 +13,31 @@
 #include "common/sdk/share.h"
 #include "common/strings.h"
 #include "fileindex/elastic_control.h"
+#include "fileindex/index_compare.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/index_mgr_move.h"
 #include "fileindex/status_mgr.h"
-#include "index_handler_compare.h"
 #include "tree_count.h"
 
 namespace quarrox::fileindexd {
 namespace {
 
 namespace elastic = fileindex::elastic;
+using fileindex::Entry;
+using fileindex::HoldsAtOrAbove;
+using fileindex::LookAt;
 using fileindex::StatusMgr;
 
 constexpr int kReindexFlags = fileindex::kShareNeedReindex | fileindex::kShareNeedRebuild;
 
 // A comparison that has written so many documents is a long one: what is left of it is worth counting.
 constexpr uint64_t kDocumentsBeforeCount = 1000;
+
+// Files below which documents are deleted with one request.
+constexpr size_t kFilesAtOnce = 1000;
+
+// How long it may take until an event is written, in seconds.
+constexpr int64_t kSlowestEvent = 5;
 
 bool IsSameFile(const struct stat& a, const struct stat& b) {
   return a.st_dev == b.st_dev && a.st_ino == b.st_ino && a.st_ctim.tv_sec == b.st_ctim.tv_sec &&
@@ -38,6 +49,28 @@ struct stat LookAtEngine() {
   if (stat(kElasticdSocketPath, &info) == 0) return info;
   throw Error(kErrEngineReceive, std::string("The search engine is not there, socket=") + kElasticdSocketPath);
 }
+
+// Makes the index say what the disk says: what differs is indexed, where only the attributes changed these are
+// refreshed, what is gone is deleted, and what cannot be read stays.
+class Mender final : public fileindex::IndexDifferences {
+ public:
+  Mender(IndexWriter& writer, const OperationHandler::CheckPoint& check_point)
+      : writer_(writer), check_point_(check_point) {}
+
+  void CheckPoint() override { check_point_(); }
+  void Missing(const std::string& path) override { writer_.Upsert(path); }
+  void Changed(const std::string& path) override { writer_.Upsert(path); }
+  // A directory has nothing else than what its attributes say.
+  void AttributesChanged(const std::string& path, bool is_directory) override {
+    if (is_directory || !writer_.RefreshAttributes(path)) writer_.Upsert(path);
+  }
+  void Gone(const std::vector<std::string>& paths) override { writer_.Delete(paths); }
+  void Unreadable(const std::string& path, int error) override { writer_.NoteUnread(path, error); }
+
+ private:
+  IndexWriter& writer_;
+  const OperationHandler::CheckPoint& check_point_;
+};
 
 }  // namespace
 
@@ -89,6 +122,9 @@ void IndexHandler::CheckEngine() const {
 void IndexHandler::Begin(const CheckPoint& check_point) {
   compared_.clear();
   refreshed_.clear();
+  moved_to_.clear();
+  moved_to_below_.clear();
+  written_.clear();
   compared_all_ = false;
   rebuilt_ = false;
   to_look_at_.reset();
@@ -97,6 +133,12 @@ void IndexHandler::Begin(const CheckPoint& check_point) {
   scope_.Read();
   ReadFailures();
   kinds_ = scope_.kinds();
+  began_ = time(nullptr);
+  struct stat kinds_info;
+  const bool is_after_another = stat(scope_.kinds_file().c_str(), &kinds_info) == 0;
+  errno = 0;
+  recent_ = is_after_another ? kinds_info.st_mtim.tv_sec - kSlowestEvent : INT64_MAX;
+  writer_.recent_reads().Begin(recent_, began_ - kSlowestEvent);
   check_point_ = [this, check_point] {
     const bool may_have_changed = check_point();
     if (!may_have_changed) return false;
@@ -187,11 +229,7 @@ void IndexHandler::FollowFolders() {
 }
 
 Kinds IndexHandler::DifferenceOf(const std::string& path, const std::string& other) const {
-  const auto kinds_at = [this](const std::string& at) {
-    const bool is_here = IsAtOrBelow(at, scope_.directory());
-    return is_here ? scope_.kinds().At(at.substr(scope_.directory().size())).value_or(Kinds()) : Kinds();
-  };
-  return kinds_at(path) ^ kinds_at(other);
+  return scope_.KindsAt(path) ^ scope_.KindsAt(other);
 }
 
 // False where there was no index: everything has been indexed then instead.
@@ -228,15 +266,21 @@ void IndexHandler::Rebuild() {
   CompareAll();
 }
 
-void IndexHandler::Compare(const std::string& path, const Kinds& forced) {
-  if (!forced.Any() && HoldsAtOrAbove(compared_, path)) return;
-  if (LookAt(path).presence == Entry::kGone) return writer_.DeleteWithAllBelow(path);
-  RunComparison(path, forced);
-  compared_.insert(path);
+// Whether a file's document is to be made anew also where it looks right.
+bool IndexHandler::IsDoubtful(const std::string& file, const struct stat& info, const Documents& documents) {
+  if (documents.of_others && !writer_.IsFresh(file)) return true;
+  if (info.st_ctim.tv_sec < recent_) return false;
+  RecentReads& reads = writer_.recent_reads();
+  if (documents.moved_from.empty()) return !reads.Has(file, info);
+  // The rename itself is the last change of what was renamed.
+  if (file.size() == documents.moved_to.size()) return false;
+  if (!reads.Has(documents.moved_from + file.substr(documents.moved_to.size()), info)) return true;
+  reads.Add(file, info);
+  return false;
 }
 
 // A comparison calls its check point once for each file and directory that it looks at.
-void IndexHandler::RunComparison(const std::string& path, const Kinds& forced) {
+void IndexHandler::FindDifferences(const std::string& path, const Kinds& forced, const Documents& documents) {
   looked_at_ = 0;
   const uint64_t done_before = writer_.tally().done;
   const OperationHandler::CheckPoint check_point = [&] {
@@ -244,9 +288,20 @@ void IndexHandler::RunComparison(const std::string& path, const Kinds& forced) {
     if (!to_look_at_ && writer_.tally().done - done_before >= kDocumentsBeforeCount) CountLooks(path);
     return check_point_();
   };
-  IndexComparison(scope_, writer_, check_point, forced).Run(path);
+  Mender mender(writer_, check_point);
+  const auto is_forced = [&](const std::string& file, const struct stat& info) {
+    return IsDoubtful(file, info, documents) || (forced.Any() && !S_ISDIR(info.st_mode) && forced.Has(file));
+  };
+  fileindex::IndexComparison(scope_, mender, is_forced).Run(path);
   to_look_at_.reset();
   ForgetStrangers(path);
+}
+
+void IndexHandler::Compare(const std::string& path, const Kinds& forced) {
+  if (!forced.Any() && HoldsAtOrAbove(compared_, path)) return;
+  if (LookAt(path).presence == Entry::kGone) return writer_.DeleteWithAllBelow(path);
+  FindDifferences(path, forced, {});
+  compared_.insert(path);
 }
 
 void IndexHandler::CountLooks(const std::string& path) {
@@ -265,8 +320,18 @@ void IndexHandler::Create(const std::string& path) {
   if (entry.presence == Entry::kGone) return writer_.DeleteWithAllBelow(path);
   if (entry.presence == Entry::kUnknown) return writer_.NoteUnread(path, entry.error);
   if (entry.IsDirectory()) return Compare(path, {});
-  if (!scope_.Accepts(path)) return writer_.Delete(path);
-  if (!writer_.IsFresh(path)) writer_.Upsert(path);
+  if (!scope_.Accepts(path)) return writer_.DeleteWithAllBelow(path);
+  if (writer_.IsFresh(path)) return;
+  writer_.Upsert(path);
+  written_.push_back(path);
+  if (written_.size() == kFilesAtOnce) DeleteBelowFiles();
+}
+
+// A file may stand where a directory was, about which nothing else was told.
+void IndexHandler::DeleteBelowFiles() {
+  std::erase_if(written_, [](const std::string& path) { return LookAt(path).IsDirectory(); });
+  writer_.DeleteBelow(written_);
+  written_.clear();
 }
 
 void IndexHandler::RefreshAttributes(const std::string& path) {
@@ -279,29 +344,43 @@ void IndexHandler::Delete(const std::string& path) {
   writer_.DeleteWithAllBelow(path);
 }
 
+// Whether the documents at a path and below it may be others than when the pass began.
+bool IndexHandler::MayHaveChanged(const std::string& path) const {
+  if (writer_.IsFresh(path) || HoldsAtOrAbove(compared_, path) || HoldsAtOrAbove(moved_to_, path)) return true;
+  const auto below = moved_to_below_.upper_bound(path + '/');
+  return below != moved_to_below_.end() && below->starts_with(path + '/');
+}
+
+// Moves the documents of what was renamed. False where they may be those of something else, which came to the old place
+// since, or where one place lies in the other.
+bool IndexHandler::Move(const std::string& path, const std::string& path_old) {
+  const bool is_nested = HoldsAtOrAbove({path}, path_old) || HoldsAtOrAbove({path_old}, path);
+  if (is_nested || MayHaveChanged(path_old) || !elastic::IsDocumentExists(scope_.share(), path_old)) return false;
+  writer_.DeleteWithAllBelow(path);
+  const bool moved = writer_.Move(path, path_old, check_point_);
+  writer_.Forget();
+  if (!moved) return false;
+  moved_to_.insert(path);
+  moved_to_below_.insert(path);
+  return true;
+}
+
 // The documents are moved where that saves reading the files again, and both ends are compared: renames may have come
-// out of the queue in another order than they were made in.
+// out of the queue in another order than they were made in. What is not moved is read, also where a document of what
+// was there before looks the same.
 void IndexHandler::Rename(const std::string& path, const std::string& path_old) {
   if (path == scope_.directory()) return CompareAll();
   const Entry entry = LookAt(path);
   const Kinds forced = DifferenceOf(path, path_old);
   const bool is_same_kind = GetFileExtension(path, true) == GetFileExtension(path_old, true);
   const bool can_move = entry.IsDirectory() || (is_same_kind && !forced.Any());
-  if (entry.presence == Entry::kThere && can_move && scope_.Accepts(path) &&
-      elastic::IsDocumentExists(scope_.share(), path_old)) {
-    writer_.Move(path, path_old, check_point_);
-  }
-  if (entry.IsDirectory()) {
-    writer_.Forget();
-  } else {
-    writer_.Forget(path);
-    writer_.Forget(path_old);
-  }
+  const bool moved = entry.presence == Entry::kThere && can_move && scope_.Accepts(path) && Move(path, path_old);
+  const Documents at_path = moved ? Documents{.moved_from = path_old, .moved_to = path} : Documents{.of_others = true};
   for (const std::string& end : {path, path_old}) {
     if (LookAt(end).presence == Entry::kGone) {
       writer_.DeleteWithAllBelow(end);
     } else {
-      RunComparison(end, forced);
+      FindDifferences(end, forced, end == path ? at_path : Documents());
     }
   }
 }
@@ -335,12 +414,19 @@ void IndexHandler::Handle(const fileindex::OP& operation) {
 }
 
 void IndexHandler::Commit() {
+  WithIndex([this] { DeleteBelowFiles(); });
   const auto commit = [this] { elastic::IndexCommit(scope_.share()); };
   if (!WithIndex(commit)) commit();
   CheckEngine();
   failures_.Save();
   if (!kinds_before_ || kinds_ != *kinds_before_) kinds_.Save(scope_.kinds_file());
   committed_kinds_ = kinds_;
+  scope_.NoteDisk();
+  const timespec times[] = {{0, UTIME_OMIT}, {began_, 0}};
+  if (utimensat(AT_FDCWD, scope_.kinds_file().c_str(), times, 0) != 0) {
+    QUARROX_LOG_FAILURE("The time of %s cannot be set", scope_.kinds_file().c_str());
+    errno = 0;
+  }
   for (const std::string& place : former_places_) fileindex::CleanFormerPlace(place);
   if (compared_all_ && NeedsReindex()) StatusMgr().UnsetShareStatus(scope_.share(), kReindexFlags);
 }

@@ -14,6 +14,8 @@ namespace quarrox::fileindexd {
 namespace {
 
 namespace elastic = fileindex::elastic;
+using fileindex::Entry;
+using fileindex::LookAt;
 
 // Refusals of the engine that concern the one document.
 constexpr int kBadArgument = 612;
@@ -33,22 +35,12 @@ bool MaySucceedLater(int error) {
 
 }  // namespace
 
-Entry LookAt(const std::string& path) {
-  Entry entry;
-  if (lstat(path.c_str(), &entry.info) == 0) {
-    entry.presence = Entry::kThere;
-  } else if (errno != ENOENT && errno != ENOTDIR) {
-    entry.presence = Entry::kUnknown;
-    entry.error = errno;
-    QUARROX_LOG_FAILURE("%.8192s cannot be looked at; what the index has of it stays", path.c_str());
-  }
-  errno = 0;
-  return entry;
-}
-
 std::optional<std::string> IndexWriter::PlaceOf(const std::string& path) const {
-  if (!IsAtOrBelow(path, scope_.directory())) return std::nullopt;
-  return path.substr(scope_.directory().size());
+  const std::string& directory = scope_.directory();
+  if (!path.starts_with(directory)) return std::nullopt;
+  std::string place = path.substr(directory.size());
+  if (!place.empty() && place.front() != '/') return std::nullopt;
+  return place;
 }
 
 void IndexWriter::Reset() {
@@ -100,7 +92,9 @@ void IndexWriter::Done(const std::string& path) {
 void IndexWriter::Upsert(const std::string& path) {
   const std::optional<std::string> place = failures_.empty() ? std::nullopt : PlaceOf(path);
   const Failure* before = place ? failures_.Find(*place) : nullptr;
-  const bool is_hopeless = before != nullptr && !before->may_succeed_later && before->IsAbout(LookAt(path).info);
+  const Entry found = LookAt(path);
+  if (found.presence == Entry::kThere) recent_reads_.Add(path, found.info);
+  const bool is_hopeless = before != nullptr && !before->may_succeed_later && before->IsAbout(found.info);
   if (is_hopeless && !before->has_document) return;
   const bool wants_contents = scope_.NeedsMeta(path) && !is_hopeless;
   const auto upsert = [&](bool need_meta) {
@@ -151,34 +145,54 @@ void IndexWriter::DeleteWithAllBelow(const std::string& path) {
 }
 
 void IndexWriter::Delete(const std::vector<std::string>& paths) {
-  const std::string index_id = elastic::GetFileIndexID(scope_.share());
-  Json::Value request(Json::objectValue);
+  Json::Value items(Json::arrayValue);
   for (const std::string& path : paths) {
     Forget(path);
     if (const std::optional<std::string> place = PlaceOf(path)) failures_.Forget(*place);
+    Done(path);
     Json::Value item(Json::objectValue);
     item["command"] = "document_del_by_id";
-    item["data"]["id"] = index_id;
     item["data"]["doc_id"] = path;
-    request["compound"].append(std::move(item));
+    items.append(std::move(item));
   }
-  Json::Value response;
-  SendRequestImpl(response, request);
-  for (const std::string& path : paths) Done(path);
+  SendAll(std::move(items));
 }
 
-void IndexWriter::Move(const std::string& path, const std::string& path_old,
+void IndexWriter::DeleteBelow(const std::vector<std::string>& paths) {
+  Json::Value items(Json::arrayValue);
+  for (const std::string& path : paths) {
+    Json::Value item(Json::objectValue);
+    item["command"] = "document_del_by_query";
+    item["data"]["query"]["qsl"]["prefix"]["VEXOMDPath"] = path + '/';
+    items.append(std::move(item));
+  }
+  SendAll(std::move(items));
+}
+
+// Changes of this share's index, with one request.
+void IndexWriter::SendAll(Json::Value items) {
+  if (items.empty()) return;
+  const std::string index_id = elastic::GetFileIndexID(scope_.share());
+  for (Json::Value& item : items) item["data"]["id"] = index_id;
+  Json::Value request(Json::objectValue);
+  request["compound"].swap(items);
+  Json::Value response;
+  SendRequestImpl(response, request);
+}
+
+bool IndexWriter::Move(const std::string& path, const std::string& path_old,
                        const OperationHandler::CheckPoint& check_point) {
   const auto failure = Try([&] { elastic::IndexRename(scope_.share(), path, path_old, check_point); });
   if (failure) {
     QUARROX_LOG_FAILURE("%.8192s is indexed anew, because its documents cannot be moved, code=%d, reason=%.8192s",
                         path.c_str(), failure->code, failure->reason.c_str());
-    return;
+    return false;
   }
   const std::optional<std::string> place = PlaceOf(path);
   const std::optional<std::string> place_old = PlaceOf(path_old);
   if (place && place_old) failures_.MoveBelow(*place_old, *place);
   Done(path);
+  return true;
 }
 
 }  // namespace quarrox::fileindexd

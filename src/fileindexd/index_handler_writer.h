@@ -1,29 +1,20 @@
 // Changes single documents of a share's index.
 #pragma once
 
-#include <sys/stat.h>
-
 #include <functional>
 #include <optional>
 #include <string>
 #include <unordered_set>
 #include <vector>
 
+#include <json/json.h>
+
 #include "fileindex/index_failures.h"
-#include "index_handler_scope.h"
+#include "fileindex/index_scope.h"
 #include "operation_handler.h"
+#include "recent_reads.h"
 
 namespace quarrox::fileindexd {
-
-// What is at a path, a symbolic link itself. What cannot be looked at is there, or nothing may be concluded from it.
-struct Entry {
-  enum Presence { kThere, kGone, kUnknown } presence = kGone;
-  struct stat info = {};
-  int error = 0;  // why it cannot be looked at
-
-  bool IsDirectory() const { return presence == kThere && S_ISDIR(info.st_mode); }
-};
-Entry LookAt(const std::string& path);
 
 // What is wrong with one path is logged and written down, and the others go on: it cannot be looked at or read, the
 // engine does not take its document. Everything else is thrown: the engine is not there or has other troubles. What
@@ -31,7 +22,8 @@ Entry LookAt(const std::string& path);
 // that vanishes is deleted from the index. Not thread-safe.
 class IndexWriter {
  public:
-  IndexWriter(const IndexScope& scope, fileindex::IndexFailures& failures) : scope_(scope), failures_(failures) {}
+  IndexWriter(const fileindex::IndexScope& scope, fileindex::IndexFailures& failures)
+      : scope_(scope), failures_(failures) {}
 
   void Upsert(const std::string& path);
 
@@ -42,12 +34,16 @@ class IndexWriter {
   void Delete(const std::string& path);
   void DeleteWithAllBelow(const std::string& path);
 
-  // Some known ones, with one request.
+  // Some known ones, or what is below some paths, with one request.
   void Delete(const std::vector<std::string>& paths);
+  void DeleteBelow(const std::vector<std::string>& paths);
+
+  // What was upserted lately.
+  RecentReads& recent_reads() { return recent_reads_; }
 
   // Moves the documents of a path and of all below it. What the engine refuses of it is logged, and is found by
-  // comparing both paths. The check point is called now and then.
-  void Move(const std::string& path, const std::string& path_old, const OperationHandler::CheckPoint& check_point);
+  // comparing both paths: the result is false then. The check point is called now and then.
+  bool Move(const std::string& path, const std::string& path_old, const OperationHandler::CheckPoint& check_point);
 
   // Writes down that a path cannot be looked at, or a directory cannot be read, for this errno.
   void NoteUnread(const std::string& path, int error);
@@ -68,11 +64,13 @@ class IndexWriter {
   using Failure = fileindex::IndexFailure;
 
   std::optional<Failure> Try(const std::function<void()>& change) const;
-  void Note(const std::string& path, const Entry& entry, Failure failure);
+  void Note(const std::string& path, const fileindex::Entry& entry, Failure failure);
   void Done(const std::string& path);
+  void SendAll(Json::Value items);
 
-  const IndexScope& scope_;
+  const fileindex::IndexScope& scope_;
   fileindex::IndexFailures& failures_;
+  RecentReads recent_reads_;
   Tally tally_;
   std::unordered_set<size_t> fresh_;  // hashes: a share may have millions of paths
 };

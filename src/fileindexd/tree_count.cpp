@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "common/file.h"
-#include "index_handler_scope.h"
+#include "fileindex/index_scope.h"
 
 namespace quarrox::fileindexd {
 
@@ -24,7 +24,8 @@ uint64_t CountTree(const std::string& directory, const OperationHandler::CheckPo
     if (!open_directory) continue;
     while (const dirent* entry = readdir(open_directory.get())) {
       const std::string name = entry->d_name;
-      if (name == "." || name == ".." || !IndexScope::AcceptsEntry(name, static_cast<mode_t>(DTTOIF(entry->d_type))))
+      if (name == "." || name == ".." ||
+          !fileindex::IndexScope::AcceptsEntry(name, static_cast<mode_t>(DTTOIF(entry->d_type))))
         continue;
       if (IsDirentDir(*entry, path)) {
         pending.emplace_back(path).append("/").append(name);

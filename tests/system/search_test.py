@@ -56,7 +56,7 @@ class SearchTest(unittest.TestCase):
         self.folders("/docs/in", "/docs/in/deep")
         self.log = self.enterContext(open(LOG, "w"))
         self.start_engine()
-        self.start("VEXONOTIFYD", "--watch", DOCS, "--queue", QUEUE)
+        self.watcher = self.start("VEXONOTIFYD", "--watch", DOCS, "--queue", QUEUE)
         self.daemon = self.start("FILEINDEXD", "--foreground")
         while "watching" not in LOG.read_text():
             time.sleep(0.01)
@@ -119,6 +119,27 @@ class SearchTest(unittest.TestCase):
         self.until_found(["in/bad.txt", "in/good.txt"], "beta")
         while "bad" in FAILURES.read_text():
             time.sleep(0.01)
+    def test_an_audit_says_what_disk_and_index_disagree_on_and_a_repair_mends_it(self):
+        inside, names = DOCS / "in", ["in/%s.txt" % name for name in ("deep/gone", "gone", "kept", "stale", "turned")]
+        for name in names:
+            machine.write(DOCS / name, "beta")
+        self.until_found(names, "beta")
+        self.watcher.kill()
+        self.assertEqual(machine.ctl("audit", "--wait", "20"), (0, [{"shares": 1, "documents": 8, "differences": 0}]))
+        for name in ("gone.txt", "turned.txt", "deep/gone.txt"):
+            (inside / name).unlink()
+        for name in ("stale.txt", "new.txt"):
+            (inside / name).write_text("alphabet")
+        (inside / "turned.txt").mkdir()
+        os.chmod(inside / "deep", 0o700)
+        for document, more in (True, []), (False, ["stale in/first.txt", "stale in/kept.txt"]):
+            machine.write(ETC / "fileindex.folders", json.dumps([{"path": "/docs/in", "name": "in", **KINDS, "document": document}]))
+            status, lines = machine.ctl("audit", "docs")
+            said = sorted(line["difference"] + " " + os.path.relpath(line["path"], DOCS) for line in lines[:-1])
+            self.assertEqual((status, said), (1, ["gone in/deep/gone.txt", "gone in/gone.txt", "missing in/new.txt",
+                                                  "stale in/deep", *more, "stale in/stale.txt", "stale in/turned.txt"]))
+        self.assertEqual(machine.ctl("audit", "--repair")[1][-1]["differences"], 0)
+        self.assertEqual((found("beta"), found("alphabet")), ([], []))
 
     def test_nothing_is_lost_when_the_engine_is_killed_in_a_pass_or_its_index_is_gone(self):
         names = ["in/many/%d/%d.txt" % (i % 20, i) for i in range(4000)]

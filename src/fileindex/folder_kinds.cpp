@@ -1,4 +1,4 @@
-#include "index_handler_kinds.h"
+#include "fileindex/folder_kinds.h"
 
 #include <cerrno>
 
@@ -7,7 +7,7 @@
 #include "common/log.h"
 #include "fileindex/util.h"
 
-namespace quarrox::fileindexd {
+namespace quarrox::fileindex {
 
 Kinds Kinds::Of(const Json::Value& data) {
   Kinds kinds;
@@ -20,24 +20,19 @@ Kinds Kinds::Of(const Json::Value& data) {
 }
 
 bool Kinds::Has(const std::string& path) const {
-  switch (fileindex::GetFileTypeByFullPath(path)) {
-    case fileindex::kFileTypeDocument:
+  switch (GetFileTypeByFullPath(path)) {
+    case kFileTypeDocument:
       return document;
-    case fileindex::kFileTypeAudio:
+    case kFileTypeAudio:
       return audio;
-    case fileindex::kFileTypeVideo:
+    case kFileTypeVideo:
       return video;
-    case fileindex::kFileTypePhoto:
+    case kFileTypePhoto:
       return photo;
-    case fileindex::kFileTypeOther:
+    case kFileTypeOther:
       break;
   }
   return Any();
-}
-
-bool IsAtOrBelow(const std::string& path, const std::string& directory) {
-  return path.compare(0, directory.size(), directory) == 0 &&
-         (path.size() == directory.size() || path[directory.size()] == '/');
 }
 
 bool HoldsAtOrAbove(const PathSet& directories, const std::string& path) {
@@ -95,4 +90,4 @@ void FolderKinds::Save(const std::string& file) const {
   if (!toFile(data, file)) QUARROX_LOG_FAILURE("%s cannot be written", file.c_str());
 }
 
-}  // namespace quarrox::fileindexd
+}  // namespace quarrox::fileindex

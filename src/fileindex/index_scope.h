@@ -1,6 +1,7 @@
-// Which paths of a share are to be indexed, and how.
+// Which paths of a share are to be indexed, and how; what is at a path.
 #pragma once
 
+#include <sys/stat.h>
 #include <sys/types.h>
 
 #include <memory>
@@ -8,23 +9,40 @@
 #include <utility>
 #include <vector>
 
+#include "common/export.h"
+#include "fileindex/folder_kinds.h"
 #include "fileindex/folder_mgr.h"
-#include "index_handler_kinds.h"
 
-namespace quarrox::fileindexd {
+namespace quarrox::fileindex {
+
+// What is at a path, a symbolic link itself. What cannot be looked at is there, or nothing may be concluded from it;
+// that is logged.
+struct Entry {
+  enum Presence { kThere, kGone, kUnknown } presence = kGone;
+  struct stat info = {};
+  int error = 0;  // why it cannot be looked at
+
+  bool IsDirectory() const { return presence == kThere && S_ISDIR(info.st_mode); }
+};
+QUARROX_API Entry LookAt(const std::string& path);
 
 // A path is indexed where a folder covers it and nothing speaks against it. A folder counts also while its record says
 // that it is paused: whoever pauses a share ends its worker first, and starts it before the records are unmarked;
 // taking the paths of a paused folder for not indexed would then empty the index.
 //
 // It holds the share and the folder list as they were when they were last read. Not thread-safe.
-class IndexScope {
+class QUARROX_API IndexScope {
  public:
   explicit IndexScope(std::string share) : share_(std::move(share)) {}
 
-  // Reads both. Throws Error 800 where the share is gone, 502 where its directory is not there, 903 where the share is
-  // encrypted and locked: nothing may be concluded from what is not on the disk then. Throws what FolderMgr throws.
+  // Reads both. Throws Error 800 where the share is gone, 502 where its directory is not there or its disk is away, 903
+  // where the share is encrypted and locked: nothing may be concluded from what is not on the disk then. Throws what
+  // FolderMgr throws.
   void Read();
+
+  // Writes down beside the index whether the share has a disk of its own, mounted at its directory, so that the empty
+  // directory without that disk is not taken for the share. A failure is logged.
+  void NoteDisk() const;
 
   // Throws Error 502 where the share's directory is not the one that Read() found: its disk went away.
   void CheckDirectory() const;
@@ -44,8 +62,13 @@ class IndexScope {
   // Whether what is in the file is to be in the index, too.
   bool NeedsMeta(const std::string& path) const { return folders_->IsFullPathNeedMeta(path); }
 
-  // The folders of the share, and the file beside its index that takes them.
+  // The folders of the share.
   const FolderKinds& kinds() const { return kinds_; }
+
+  // Those of a path, which may lie outside of the share.
+  Kinds KindsAt(const std::string& path) const;
+
+  // The file beside the index that takes the folders with which it was made.
   const std::string& kinds_file() const { return kinds_file_; }
 
   // Where walks begin that together meet everything covered at a path and below it, each once.
@@ -56,9 +79,11 @@ class IndexScope {
   std::string directory_;
   dev_t device_ = 0;
   ino_t inode_ = 0;
-  std::unique_ptr<fileindex::FolderMgr> folders_;
+  bool has_own_disk_ = false;
+  std::string disk_note_;  // stands where it has one
+  std::unique_ptr<FolderMgr> folders_;
   FolderKinds kinds_;
   std::string kinds_file_;
 };
 
-}  // namespace quarrox::fileindexd
+}  // namespace quarrox::fileindex

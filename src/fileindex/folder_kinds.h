@@ -10,9 +10,11 @@
 
 #include <json/json.h>
 
-namespace quarrox::fileindexd {
+#include "common/export.h"
 
-struct Kinds {
+namespace quarrox::fileindex {
+
+struct QUARROX_API Kinds {
   bool document = false;
   bool audio = false;
   bool video = false;
@@ -36,7 +38,7 @@ struct Kinds {
 // The folders of one share with their kinds. They are written down beside the index when it was made with them, so that
 // a change of the folder list is seen also where the event that tells of it was lost or came to be part of another one.
 // Paths are taken from the share's directory, whose own is empty, so that they outlive a rename of the share.
-class FolderKinds {
+class QUARROX_API FolderKinds {
  public:
   void Add(const std::string& path, const Kinds& kinds) { folders_.emplace(path, kinds); }
 
@@ -57,9 +59,8 @@ class FolderKinds {
   std::map<std::string, Kinds> folders_;
 };
 
-// By whole components: whether a path is a directory or lies below it; whether it is one of some, or lies below one.
+// Whether a path is one of some directories or lies below one, by whole components.
 using PathSet = std::unordered_set<std::string>;
-bool IsAtOrBelow(const std::string& path, const std::string& directory);
-bool HoldsAtOrAbove(const PathSet& directories, const std::string& path);
+QUARROX_API bool HoldsAtOrAbove(const PathSet& directories, const std::string& path);
 
-}  // namespace quarrox::fileindexd
+}  // namespace quarrox::fileindex

@@ -1,0 +1,123 @@
+#!/usr/bin/env python3
+"""Whatever happens to files and daemons: once all is quiet, disk and index agree. FILEINDEX_LONG gives it full length.
+
+TRUTH_SEED    the first seed (1)
+"""
+import collections
+import itertools
+import os
+import pathlib
+import signal
+import subprocess
+import time
+import unittest
+
+import private_machine as machine
+from random_files import Files
+
+SEED, PATIENCE = int(os.environ.get("TRUTH_SEED", "1")), 60  # seconds
+SEEDS, KILLS = (300, 50) if os.environ.get("FILEINDEX_LONG") else (2, 2)
+SCRATCH, VOLUME, DOCS, LOG = (machine.SCRATCH + place for place in ("", "/v", "/v/docs", "/log"))
+DAEMONS = {"VEXOELASTICD": ["--foreground", "--data", SCRATCH + "/engine"], "FILEINDEXD": ["--foreground"], "VEXONOTIFYD": ["--foreground"]}
+
+
+class TruthTest(unittest.TestCase):
+    def restart(self, name, *more):
+        if name in self.daemons:
+            self.daemons[name].kill()
+            self.daemons[name].wait()
+        self.daemons[name] = subprocess.Popen([os.environ[name], *DAEMONS[name], *more], stderr=self.log)
+
+    def setUp(self):
+        self.addCleanup(subprocess.run, f"umount -lq {DOCS}; umount -lq {VOLUME}; umount -lq {SCRATCH}/disk", shell=True)
+        subprocess.run(f"rm -rf {SCRATCH}/* /var/lib/vexo* /var/packages /run/*.sock; mkdir -p {VOLUME} {SCRATCH}/disk; mount -t "
+                       f"tmpfs -o size=160m v {VOLUME}; mkdir -p {DOCS} {VOLUME}/outside {SCRATCH}/engine", shell=True, check=True)
+        machine.write("/etc/vexo/shares.conf", "[docs]\npath = %s\n" % DOCS)
+        self.log, self.daemons = self.enterContext(open(LOG, "w")), {}
+        for name in DAEMONS:
+            self.restart(name)
+            self.addCleanup(lambda name=name: (self.daemons[name].kill(), self.daemons[name].wait()))
+        subprocess.run("until [ -S /run/vexoelasticd.sock -a -S /run/fileindexd.sock ]; do sleep 0.01; done", shell=True, check=True)
+        self.assertEqual(machine.ctl("folder", "add", "/docs", "--name", "docs")[0], 0)
+
+    def expect_truth(self, files, seed):
+        """Waits for quiet. A change through one name of a file is not seen at its other names: a repair finds it."""
+        is_linked = lambda path: os.path.lexists(os.fsencode(path)) and os.lstat(os.fsencode(path)).st_ino in files.linked
+        end, left = time.monotonic() + PATIENCE, True
+        while left:
+            status, lines = machine.ctl("audit", "docs", "--wait", str(PATIENCE))
+            left = "differences" not in lines[-1] or "pending" in lines[-1] or [line for line in lines[:-1] if not is_linked(line["path"])]
+            self.assertLess(time.monotonic(), end, (seed, lines, pathlib.Path(LOG).read_bytes()[-5000:]))
+        self.assertEqual(status and machine.ctl("audit", "docs", "--repair")[0], 0, seed)
+        holders = collections.defaultdict(set, {word: set() for word in files.words[:20]})  # some are no more
+        for path in map(os.fsdecode, filter(os.path.isfile, files.paths())):
+            for word in set() if os.path.islink(path) else set(pathlib.Path(path).read_text().split()) & set(files.words):
+                holders[word].add(path)
+        for word, paths in holders.items():
+            hits = {hit["path"] for hit in machine.ctl("search", word)[1]}
+            self.assertEqual(set(itertools.filterfalse(is_linked, hits ^ paths)), set(), (seed, word))
+
+    def test_operations_drained_in_random_portions(self):
+        for seed in range(SEED, SEED + SEEDS):
+            files, stopped = Files(DOCS, VOLUME + "/outside", seed), []
+            for _ in range(25):
+                files.step(files.rng.randrange(12))
+                if not stopped and files.rng.random() < 0.3:
+                    workers = map(int, subprocess.getoutput("pgrep -P %d" % self.daemons["FILEINDEXD"].pid).split())
+                    stopped.append(files.rng.choice([self.daemons["VEXONOTIFYD"].pid, *workers]))
+                    os.kill(stopped[0], signal.SIGSTOP)
+                files.step(files.rng.randrange(6))
+                time.sleep(max(0, files.rng.random() * 0.6 - 0.4))
+                while stopped and files.rng.random() < 0.7:
+                    os.kill(stopped.pop(), signal.SIGCONT)
+            for pid in stopped:
+                os.kill(pid, signal.SIGCONT)
+            self.expect_truth(files, seed)
+
+    def test_each_daemon_killed_at_random_moments(self):
+        for seed in range(SEED, SEED + KILLS):
+            files = Files(DOCS, VOLUME + "/outside", -seed, alike=False)
+            for name in files.rng.sample(list(DAEMONS), len(DAEMONS)):
+                files.step(files.rng.randrange(120))
+                time.sleep(files.rng.random() * 0.5)
+                files.step()
+                self.restart(name)
+                files.step()
+            self.expect_truth(files, -seed)
+
+    def test_a_full_disk_an_overflowing_kernel_queue_and_a_disk_that_comes_and_goes(self):
+        files = Files(DOCS, VOLUME + "/outside", SEED, alike=False)
+        files.step(60)
+        subprocess.run(["cp", "/dev/zero", VOLUME + "/big"], stderr=subprocess.DEVNULL)
+        files.step(60)
+        time.sleep(2)
+        os.unlink(VOLUME + "/big")
+        self.expect_truth(files, "full disk")
+
+        self.restart("VEXONOTIFYD", "--limited-queue")
+        self.expect_truth(files, "limited queue")
+        self.daemons["VEXONOTIFYD"].send_signal(signal.SIGSTOP)
+        list(map(lambda path: (os.mknod(path), os.unlink(path)), (DOCS + "/%d" % n for n in range(9000))))
+        files.step(60)
+        self.daemons["VEXONOTIFYD"].send_signal(signal.SIGCONT)
+        self.expect_truth(files, "overflow")
+
+        subprocess.run(f"mount -t tmpfs disk {SCRATCH}/disk; cp -a {DOCS}/. {SCRATCH}/disk; rm -r {DOCS}/*; mount --bind {SCRATCH}/disk "
+                       f"{DOCS}", shell=True, check=True)
+        self.restart("VEXONOTIFYD")
+        files.write(DOCS + "/kept.txt")
+        self.expect_truth(files, "on its own disk")
+        subprocess.run(["umount", "-l", DOCS], check=True)
+        self.restart("VEXONOTIFYD")
+        time.sleep(2)
+        self.assertEqual(len(machine.ctl("search", files.words[-1])[1]), 1, "what is on a disk that is away is not deleted")
+        subprocess.run(["mount", "--bind", SCRATCH + "/disk", DOCS], check=True)
+        self.restart("VEXONOTIFYD")
+        files.step(60)
+        self.expect_truth(files, "its disk is back")
+
+
+if __name__ == "__main__":
+    machine.enter()
+    print("seed %d" % SEED)
+    unittest.main()
