@@ -1,45 +1,42 @@
-# The daemons at work, in a mount namespace of their own. Sourced by scripts/quickstart, which removes what is left.
-#   QUICKSTART_SCRATCH  the directory of the run, with the programs in bin/ and files.tar
+# The daemons at work, in namespaces of their own. Sourced by scripts/quickstart, which removes what is left.
+#   QUICKSTART_SCRATCH  the directory of the run, with the programs in bin/
 #   QUICKSTART_SHARED   what is indexed
-#   QUICKSTART_OWN      a directory in it, in which files change; it holds inbox/ already
+#   QUICKSTART_OWN      a directory in it, it or a directory in it, in which files change; it holds those of $scratch/list
+#   QUICKSTART_PROMPT   whether to ask for searches
+# Standard error is descriptor 3 yet.
 # shellcheck shell=bash
 
+exec 2>&3 3>&-
 scratch=$QUICKSTART_SCRATCH
 volume=$scratch/volume
 share=$volume/files
-own=$share${QUICKSTART_OWN#"$QUICKSTART_SHARED"}
+own=$share${QUICKSTART_OWN#"${QUICKSTART_SHARED%/}"}
 patience=10 # seconds until a change must be found
 
-daemons=()
-end_daemons() {
-  if [ ${#daemons[@]} -gt 0 ]; then kill -KILL "${daemons[@]}" 2>/dev/null && wait "${daemons[@]}" 2>/dev/null; fi || true
-}
-trap end_daemons EXIT
-trap 'exit 143' TERM
-
-# The directory is the only share; its index lies beside it, in the scratch directory.
-mkdir -p "$share" "$volume/@fileindex/files"
+# The directory is the only share, on a volume of its own; its index lies beside it, in the scratch directory.
+mkdir -p "$share"
 exec {kept}<"$scratch"
 mount --rbind "$QUICKSTART_SHARED" "$share"
 cp -RP --preserve=mode /etc "$scratch/etc" 2>/dev/null || true
-mount --bind "$scratch/etc" /etc
-for place in /run /var; do mount -t tmpfs -o mode=0755 quickstart "$place"; done
+for place in /run /var /tmp; do mount -t tmpfs -o mode=1777 quickstart "$place"; done
 ln -s /run /var/run
-mkdir -p /var/tmp /var/lib /var/packages/Quarrox/etc /etc/vexo
+mkdir -p /var/tmp /var/lib
 if ! [ -d "$share" ]; then # it lay in one of these places
   mkdir -p "$scratch"
   mount -c --rbind "/proc/$$/fd/$kept" "$scratch"
 fi
+exec {kept}<&-
+cd /
+mount --bind "$scratch/etc" /etc # after /run, where mount looks whether fstab has changed
+mkdir -p /etc/vexo
 printf '[files]\npath = %s\n' "$share" >/etc/vexo/shares.conf
-cat >/var/packages/Quarrox/etc/fileindex.folders <<'EOF'
-[{"path": "/files", "name": "files", "document": true, "audio": true, "video": true, "photo": true}]
-EOF
 rm -rf /etc/samba
 export LD_LIBRARY_PATH=$scratch/bin
 PATH=$scratch/bin:$PATH
 
+daemons=()
 start() {
-  "$@" </dev/null 2>>"$scratch/daemons" &
+  "$@" --foreground </dev/null 2>>"$scratch/daemons" &
   daemons+=($!)
 }
 
@@ -49,14 +46,16 @@ fail_here() {
   fail "$@"
 }
 
+now() { echo "${EPOCHREALTIME/[^0-9]/}"; } # microseconds
+
 # Waits until a command succeeds, for a number of seconds.
 await() {
-  local end=$((${EPOCHREALTIME/[^0-9]/} + $1 * 1000000)) daemon
+  local end=$(($(now) + $1 * 1000000)) daemon
   shift
   until "$@"; do
     for daemon in "${daemons[@]}"; do kill -0 "$daemon" 2>/dev/null || fail_here "a daemon ended"; done
-    [ "${EPOCHREALTIME/[^0-9]/}" -lt "$end" ] || return 1
-    sleep 0.05
+    [ "$(now)" -lt "$end" ] || return 1
+    sleep 0.02
   done
 }
 
@@ -69,65 +68,89 @@ finds() {
 finds_not() { ! finds "$@"; }
 finds_instead() { finds "$2" "${@:3}" && finds_not "$1" "${@:3}"; }
 
-# A search as a person types it, with the paths outside of here.
+# What a command prints, with the paths as they are outside of here.
 show() {
-  local started=$EPOCHREALTIME took
-  fileindexctl search --limit 3 "$@" >"$scratch/hits"
-  took=$(seconds "$started")
-  echo "  \$ fileindexctl search --limit 3 $*"
-  share=$share shared=$QUICKSTART_SHARED awk '/^PATH  / { next } {
-    while (at = index($0, ENVIRON["share"])) $0 = substr($0, 1, at - 1) ENVIRON["shared"] substr($0, at + length(ENVIRON["share"]))
-    print "    " $0
-  }' "$scratch/hits"
-  echo "    ($took)"
+  local line
+  { "$@" 2>&1 || true; } | while IFS= read -r line; do
+    case $line in 'PATH  '*) ;; *) echo "    ${line//"$share"/"${QUICKSTART_SHARED%/}"}" ;; esac
+  done
+}
+show_search() {
+  local started=$EPOCHREALTIME
+  show fileindexctl search "$@"
+  echo "    ($(seconds "$started"))"
 }
 
-# Says how long a change took to be found; the rest is the command that finds it.
+# Says how long a change since $started took to be found; the rest is the command that finds it.
 follow() {
-  local what=$1 started=$2
-  shift 2
+  local what=$1 late=''
+  shift
   await "$patience" "$@" || fail_here "$what, and no search knew of it after $patience s"
-  echo "  $what: found after $(seconds "$started")"
+  [ $(($(now) - ${started/[^0-9]/})) -le 1000000 ] || late=', which is more than a second'
+  echo "  $what: found after $(seconds "$started")$late"
 }
 
 say "Indexing $QUICKSTART_SHARED"
-started=$EPOCHREALTIME
-queue=$(fileindexctl share show --json files | sed -n 's/.*"queue_path":"\([^"]*\)".*/\1/p')
 : >"$scratch/daemons"
-start vexoelasticd --foreground --data "$scratch/engine"
-start vexonotifyd --watch "$share" --queue "$queue"
-await "$patience" test -S /run/vexoelasticd.sock || fail_here "the search engine did not start"
-await "$patience" grep -q '^watching ' "$scratch/daemons" || fail_here "vexonotifyd did not start"
-echo '{"event":65536,"path":"'"$share"'"}' >>"$queue"
-start fileindexd --foreground
-until await "$patience" finds "$own/inbox/usr/include/linux/input.h" input.h --name; do
-  # A directory of one's own may hold any number of files.
-  [ "$QUICKSTART_SHARED" != "$scratch/scratch" ] || fail_here "nothing was found after $patience s"
-  echo "  still indexing after $(seconds "$started")"
+start vexoelasticd --data "$scratch/engine"
+start vexonotifyd
+start fileindexd
+for socket in vexoelasticd fileindexd; do
+  await "$patience" test -S "/run/$socket.sock" || fail_here "$socket did not start"
 done
+started=$EPOCHREALTIME
+fileindexctl folder add /files --name files >"$scratch/log" 2>&1 ||
+  { show cat "$scratch/log" >&2 && fail "this directory cannot be indexed: $QUICKSTART_SHARED"; }
+fileindexctl status --follow --until-idle || fail_here "the indexing did not come to its end"
+last=$own/$(tail -n 1 "$scratch/list")
+await "$patience" finds "$last" "${last##*/}" --name || fail_here "all is said to be indexed, and no search finds $last"
 echo "  all of it is found after $(seconds "$started")"
-
-say "Searching for words, and for names"
-show keyboard
-show --name keyb
+if grep -q 'inotify is used$' "$scratch/daemons"; then
+  echo "  fanotify takes root; changes are heard by inotify, with one watch for each directory"
+fi
 
 say "Changing things"
+mkdir "$own/letters"
 started=$EPOCHREALTIME
-mkdir "$own/projects"
-tar -C "$own/projects" -xf "$scratch/files.tar"
-mkdir "$own/projects/letters"
-echo "The quickstart wrote this letter, and mentions a quokka." >"$own/projects/letters/letter.txt"
-follow "unpacked $(wc -l <"$scratch/files") files" "$started" finds "$own/projects/letters/letter.txt" quokka
+echo "The quickstart wrote this letter, and mentions a quokka." >"$own/letters/letter.txt"
+follow "wrote a file" finds "$own/letters/letter.txt" quokka
 
 started=$EPOCHREALTIME
-mv "$own/inbox/usr/include/linux" "$own/inbox/usr/include/kernel"
-follow "renamed a directory" "$started" \
-  finds_instead "$own/inbox/usr/include/linux/input.h" "$own/inbox/usr/include/kernel/input.h" input.h --name
+mv "$own/usr/include/linux" "$own/usr/include/kernel"
+follow "renamed a directory" \
+  finds_instead "$own/usr/include/linux/acct.h" "$own/usr/include/kernel/acct.h" acct.h --name
 
 started=$EPOCHREALTIME
-echo "The quokka became a wombat." >"$own/projects/letters/letter.txt"
-follow "wrote a file anew" "$started" finds "$own/projects/letters/letter.txt" wombat
+rm "$own/letters/letter.txt"
+follow "deleted a file" finds_not "$own/letters/letter.txt" quokka
 
-started=$EPOCHREALTIME
-rm "$own/projects/letters/letter.txt"
-follow "deleted a file" "$started" finds_not "$own/projects/letters/letter.txt" wombat
+say "Searching"
+if [ -z "$QUICKSTART_PROMPT" ]; then
+  for search in keyboard '--name acc'; do
+    echo "  \$ fileindexctl search --limit 3 $search"
+    # shellcheck disable=SC2086
+    show_search --limit 3 $search
+  done
+  exit
+fi
+
+echo "  Words find files; all words must be there. Files in ${QUICKSTART_OWN} may be changed meanwhile."
+help() {
+  echo "    WORDS       files with all of these words; -WORD: without it; WORD*: that begin so"
+  echo "    :name TEXT  files with a part of their names"
+  echo "    :status     what is indexed and what waits"
+  echo "    :quit       the end, as Ctrl-D"
+}
+help
+while IFS=$' \t' read -re -p 'search> ' line; do
+  history -s -- "$line"
+  case $line in
+    '') ;;
+    :quit) break ;;
+    :help) help ;;
+    :status) show fileindexctl status ;;
+    ':name '*) show_search --name -- "${line#:name }" ;;
+    :*) echo "    there is no $line; :help lists what there is" ;;
+    *) show_search -- "$line" ;;
+  esac
+done

@@ -7,6 +7,7 @@ say() { printf '%s%s%s\n' "$bold" "$*" "$plain"; }
 fail() { printf 'quickstart: %s\n' "$*" >&2; exit 1; }
 
 # Says nothing while all goes well.
+# shellcheck disable=SC2154
 quietly() { "$@" >"$scratch/log" 2>&1 </dev/null || { cat "$scratch/log" >&2; fail "this failed: $*"; }; }
 
 # Since a time of $EPOCHREALTIME.

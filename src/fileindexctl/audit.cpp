@@ -177,7 +177,7 @@ class Auditor {
 
   void PrintTotal() const {
     if (!json_) {
-      std::cout << differences_ << " differences among " << documents_ << " documents of " << shares_ << " shares\n";
+      std::cout << "differences: " << differences_ << ", documents: " << documents_ << ", shares: " << shares_ << '\n';
       return;
     }
     Json::Value object;

@@ -87,6 +87,7 @@ int ShareRebuild(const Arguments& arguments);
 int ShareRename(const Arguments& arguments);
 int ShareResume(const Arguments& arguments);
 int ShareShow(const Arguments& arguments);
+int Status(const Arguments& arguments);
 int SuggestRebuild(const Arguments& arguments);
 int ExplainPath(const Arguments& arguments);
 

@@ -14,6 +14,7 @@ namespace {
 const std::pair<const char*, const char*> kOptionTexts[] = {
     {"--complete", "print what a shell can complete the last of the words to"},
     {"--desc", "the last first"},
+    {"--follow", "go on and show each change, until Ctrl-C"},
     {"--group=", "the folders' group, which is any name"},
     {"--json", "print one JSON object, or one a line for listings"},
     {"--keyword=", "only folders with this text in their path or name"},
@@ -23,11 +24,14 @@ const std::pair<const char*, const char*> kOptionTexts[] = {
     {"--name=", "the folder's name for people; without it that of its directory"},
     {"--offset=", "pass over so many first"},
     {"--owner=", "the user whom the folder belongs to"},
+    {"--repair", "queue what mends the differences, wait for it, and look again"},
     {"--share=", "only in this share"},
     {"--sort=", "what they are sorted by; path without it"},
     {"--summary", "print only the counts"},
     {"--type=", "only files with one of these extensions, with commas between them"},
     {"--types=", "the kinds of files that are indexed, with commas between them"},
+    {"--until-idle", "follow only until nothing is left to be done; status 1 where a share waits for over a minute"},
+    {"--wait=", "let pending work end first, for so long"},
 };
 
 const char* TextOf(const std::string& option) {

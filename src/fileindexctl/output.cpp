@@ -2,7 +2,10 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <ctime>
 #include <ostream>
+
+#include "fileindex/status_mgr.h"
 
 namespace quarrox::ctl {
 namespace {
@@ -42,6 +45,26 @@ std::string SizeText(uint64_t bytes) {
   char text[32];
   snprintf(text, sizeof(text), "%.1f %ciB", size, *unit);
   return text;
+}
+
+std::string Duration(int64_t seconds) {
+  if (seconds >= 2 * 86400) return std::to_string(seconds / 86400) + " days";
+  if (seconds >= 2 * 3600) return std::to_string(seconds / 3600) + " hours";
+  if (seconds >= 2 * 60) return std::to_string(seconds / 60) + " min";
+  return std::to_string(seconds) + " s";
+}
+
+// A time that has passed says that indexing runs again.
+std::string DescribePause(int64_t resume_time) {
+  if (resume_time == fileindex::kPausedWithoutEnd) return "paused without end";
+  const time_t end = resume_time;
+  tm local = {};
+  char text[64];
+  if (end <= time(nullptr) || localtime_r(&end, &local) == nullptr ||
+      strftime(text, sizeof(text), "%F %T %Z", &local) == 0) {
+    return "running";
+  }
+  return std::string("paused until ") + text;
 }
 
 void PrintTable(std::ostream& out, const std::vector<std::vector<std::string>>& rows) {

@@ -14,6 +14,12 @@ std::string Visible(const std::string& text);
 // A number of bytes: "17 B", "4.2 MiB".
 std::string SizeText(uint64_t bytes);
 
+// In the largest unit that fits: "3 days", "12 s".
+std::string Duration(int64_t seconds);
+
+// The state of pausing, by what StatusMgr says of it: "paused until 2026-11-21 11:52:35 UTC", "running".
+std::string DescribePause(int64_t resume_time);
+
 // Rows of equally many texts, the first of which is the heading. Columns are as wide as their widest text.
 void PrintTable(std::ostream& out, const std::vector<std::vector<std::string>>& rows);
 

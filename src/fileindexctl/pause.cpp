@@ -1,5 +1,4 @@
 #include <charconv>
-#include <ctime>
 #include <iostream>
 #include <string>
 
@@ -7,6 +6,7 @@
 #include "common/error.h"
 #include "common/json.h"
 #include "fileindex/status_mgr.h"
+#include "output.h"
 
 namespace quarrox::ctl {
 namespace {
@@ -22,19 +22,6 @@ int HoursOf(const std::string& text) {
   return hours;
 }
 
-// A time that has passed says that indexing runs again.
-std::string Describe(int64_t resume_time) {
-  if (resume_time == fileindex::kPausedWithoutEnd) return "paused without end";
-  const time_t end = resume_time;
-  tm local = {};
-  char text[64];
-  if (end <= time(nullptr) || localtime_r(&end, &local) == nullptr ||
-      strftime(text, sizeof(text), "%F %T %Z", &local) == 0) {
-    return "running";
-  }
-  return std::string("paused until ") + text;
-}
-
 // The setters save before they tell the daemon: where only that failed, people are to know that the change holds.
 template <typename Set>
 int Change(const Arguments& arguments, const Set& set) {
@@ -43,7 +30,8 @@ int Change(const Arguments& arguments, const Set& set) {
     set(status);
   } catch (const Error& error) {
     if (error.code == kErrSystem && StatusMgr().GetPauseInfo() == status.GetPauseInfo()) {
-      std::cerr << "fileindexctl: saved: " << Describe(status.GetPauseInfo()) << "; but fileindexd was not reached\n";
+      std::cerr << "fileindexctl: saved: " << DescribePause(status.GetPauseInfo())
+                << "; but fileindexd was not reached\n";
     }
     throw;
   }
@@ -53,7 +41,7 @@ int Change(const Arguments& arguments, const Set& set) {
     answer["resume_time"] = static_cast<Json::Int64>(resume_time);
     std::cout << toString(answer) << '\n';
   } else {
-    std::cout << Describe(resume_time) << '\n';
+    std::cout << DescribePause(resume_time) << '\n';
   }
   return kDone;
 }

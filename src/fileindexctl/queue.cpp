@@ -111,14 +111,6 @@ std::string AsJson(const QueueFile& file) {
   return toString(object);
 }
 
-// In the largest unit that fits: "3 days", "12 s".
-std::string Duration(int64_t seconds) {
-  if (seconds >= 2 * 86400) return std::to_string(seconds / 86400) + " days";
-  if (seconds >= 2 * 3600) return std::to_string(seconds / 3600) + " hours";
-  if (seconds >= 2 * 60) return std::to_string(seconds / 60) + " min";
-  return std::to_string(seconds) + " s";
-}
-
 }  // namespace
 
 int QueueList(const Arguments& arguments) {

@@ -1,0 +1,213 @@
+#include "status.h"
+
+#include <fcntl.h>
+#include <signal.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <ctime>
+#include <fstream>
+#include <set>
+#include <utility>
+
+#include "common/comm.h"
+#include "common/error.h"
+#include "common/file.h"
+#include "common/sdk/open_shares.h"
+#include "common/unique_fd.h"
+#include "daemon_exchange.h"
+#include "fileindex/communication.h"
+#include "fileindex/elastic_control.h"
+#include "fileindex/folder_mgr.h"
+#include "fileindex/folder_status.h"
+#include "fileindex/queue_mgr.h"
+#include "fileindex/status_mgr.h"
+#include "output.h"
+#include "refusal.h"
+
+namespace quarrox::ctl {
+namespace {
+
+using fileindex::IndexProgress;
+using State = ShareStatus::State;
+
+// Whether a stream socket listens at a path. A socket of another type is told apart from nobody, and its try disturbs
+// no listener.
+bool Listens(const char* path) {
+  const UniqueFd fd(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  sockaddr_un address = {};
+  address.sun_family = AF_UNIX;
+  strncpy(address.sun_path, path, sizeof(address.sun_path) - 1);
+  return connect(fd.get(), reinterpret_cast<const sockaddr*>(&address), sizeof(address)) == 0 ||
+         (errno != ENOENT && errno != ECONNREFUSED);
+}
+
+// What a worker told holds as long as it runs; its number may be another process's by now.
+bool IsWorker(int64_t pid) {
+  if (pid <= 0 || (kill(static_cast<pid_t>(pid), 0) != 0 && errno != EPERM)) return false;
+  std::string name;
+  return std::getline(std::ifstream("/proc/" + std::to_string(pid) + "/comm"), name) && name == "fileindexd";
+}
+
+// What concerns all shares.
+struct Machine {
+  bool daemon_runs = Listens(fileindex::kDaemonSocketPath);
+  fileindex::StatusMgr status = {};
+  int64_t resume_time = status.GetPauseInfo();
+  int64_t now = time(nullptr);
+
+  bool IsPaused() const { return resume_time == fileindex::kPausedWithoutEnd || resume_time > now; }
+};
+
+// A queue's file is made for its first event.
+void AddQueueFile(ShareStatus& share, const std::string& path, int64_t now) {
+  struct statx file;
+  if (statx(AT_FDCWD, path.c_str(), 0, STATX_SIZE | STATX_MTIME | STATX_BTIME, &file) != 0) return;
+  const bool has_birth = (file.stx_mask & STATX_BTIME) != 0;
+  const int64_t age = now - (has_birth ? file.stx_btime : file.stx_mtime).tv_sec;
+  share.queue_bytes += file.stx_size;
+  share.queue_age = std::max({int64_t{0}, age, share.queue_age.value_or(0)});
+}
+
+void Set(ShareStatus& share, State state, const std::string& reason = {}) {
+  share.state = state;
+  share.reason = reason;
+}
+
+// The first that holds of what may keep a share from being indexed, then what is under way.
+void Judge(ShareStatus& share, const sdk::SDKShare& opened, bool is_paused, const Machine& machine) {
+  const Refusal refusal = RefusalOf(opened);
+  if (refusal) return Set(share, State::kBlocked, refusal.reason + "; " + refusal.remedy);
+  if (is_paused) return Set(share, State::kPaused, "paused; 'fileindexctl share resume " + share.name + "' ends it");
+  if (machine.IsPaused()) return Set(share, State::kPaused, DescribePause(machine.resume_time));
+  const int flags = machine.status.GetShareStatus(share.name);
+  if (share.progress.state == IndexProgress::State::kWorking) {
+    share.rebuilding = (flags & fileindex::kShareNeedRebuild) != 0;
+    return Set(share, State::kWorking);
+  }
+  if (share.progress.state == IndexProgress::State::kWaiting) return Set(share, State::kWaiting, share.progress.reason);
+  if (share.queue_age && !machine.daemon_runs) return Set(share, State::kWaiting, "fileindexd is not running");
+  if (share.queue_age) return Set(share, State::kPending);
+  if ((flags & fileindex::kShareNeedRebuild) != 0) {
+    return Set(share, State::kOutdated, "damaged; 'fileindexctl share rebuild " + share.name + "' makes it anew");
+  }
+  if (flags != 0) {
+    return Set(share, State::kOutdated, "incomplete; 'fileindexctl folder reindex /" + share.name + "' mends it");
+  }
+}
+
+// False where there is no such share.
+bool LookAt(ShareStatus& share, bool is_paused, const Machine& machine, sdk::OpenShares& shares) {
+  try {
+    const sdk::SDKShare& opened = shares.Get(share.name);
+    share.progress_file = IndexProgress::FileOf(opened);
+    const std::optional<IndexProgress> told = IndexProgress::Load(share.progress_file);
+    if (told && IsWorker(told->pid)) share.progress = *told;
+    const fileindex::QueueMgr queue(opened.GetQueuePath());
+    for (const std::string& path : {queue.queue_path(), queue.queue_path_tmp()}) {
+      AddQueueFile(share, path, machine.now);
+    }
+    Judge(share, opened, is_paused, machine);
+    return true;
+  } catch (const Error& error) {
+    if (error.code != kErrNoSuchShare) throw;
+    Set(share, State::kBlocked,
+        "the share is gone; 'fileindexctl share clear-paused' takes its folders out of the list");
+    return false;
+  }
+}
+
+// Asks how many documents some indexes hold, all at once. False where one of them fails the request for all; what is
+// not told otherwise stays unknown.
+bool Ask(const std::vector<ShareStatus*>& shares) {
+  Json::Value request(Json::objectValue);
+  for (const ShareStatus* share : shares) {
+    Json::Value item(Json::objectValue);
+    item["command"] = "document_get_by_query";
+    item["data"]["id"] = fileindex::elastic::GetFileIndexID(share->name);
+    Json::Value& query = item["data"]["query"];
+    // As a search, which waits for no change that is under way.
+    query["qsl"]["bool"]["must"]["prefix"]["VEXOMDPath"] = "";
+    query["size"] = 0;
+    request["compound"].append(item);
+  }
+  const Json::Value response = Exchange(kElasticdSocketPath, request).object;
+  if (!response["success"].asBool()) return false;
+  const Json::Value& answers = response["data"];
+  for (Json::ArrayIndex i = 0; i < std::min(answers.size(), static_cast<Json::ArrayIndex>(shares.size())); ++i) {
+    const Json::Value& total = answers[i]["total"];
+    if (total.isUInt64()) shares[i]->documents = total.asUInt64();
+  }
+  return true;
+}
+
+// Throws where the engine does not answer.
+void CountDocuments(IndexingStatus& status, sdk::OpenShares& opened) {
+  std::vector<ShareStatus*> shares;
+  for (ShareStatus& share : status.shares) {
+    const bool has_index = share.state != State::kBlocked && IsDirExist(opened.Get(share.name).GetDBPath(), false);
+    if (has_index) shares.push_back(&share);
+  }
+  if (shares.empty() || Ask(shares)) return;
+  for (ShareStatus* share : shares) Ask({share});
+}
+
+void AddFolders(IndexingStatus& status, const fileindex::FolderMgr& folders, sdk::OpenShares& shares) {
+  fileindex::FolderStatuses statuses(folders, shares);
+  for (const auto& folder : folders.GetFolders()) {
+    const std::string name = folder->GetShare();
+    const auto share = std::ranges::lower_bound(status.shares, name, {}, &ShareStatus::name);
+    if (share == status.shares.end() || share->name != name) continue;
+    Json::Value text;
+    statuses.GetStatus(text, *folder);
+    share->folders.emplace_back(folder->GetPath(), folder->IsPaused() ? "paused" : text["text"].asString());
+  }
+}
+
+}  // namespace
+
+IndexingStatus LookAtIndexing(bool with_folders) {
+  const Machine machine;
+  fileindex::FolderMgr folders;
+  std::set<std::string> active;
+  for (const auto& folder : folders.GetFolders()) {
+    if (!folder->IsPaused()) active.insert(folder->GetShare());
+  }
+  IndexingStatus status;
+  sdk::OpenShares shares;
+  for (const std::string& name : folders.GetIndexedShares()) {
+    ShareStatus& share = status.shares.emplace_back(ShareStatus{.name = name});
+    if (!LookAt(share, !active.contains(name), machine, shares)) folders.DeleteByShare(name);
+  }
+  if (!machine.daemon_runs) status.problems.emplace_back("fileindexd is not running, so nothing is indexed");
+  try {
+    CountDocuments(status, shares);
+  } catch (const Error& error) {
+    status.problems.push_back("the search engine, vexoelasticd, does not work: " + error.reason);
+  }
+  if (with_folders) AddFolders(status, folders, shares);
+  return status;
+}
+
+bool ShareStatus::IsBusy() const {
+  return state == State::kPending || state == State::kWorking || state == State::kWaiting ||
+         (state == State::kPaused && queue_age);
+}
+
+std::optional<double> ShareStatus::Rate() const {
+  const int64_t seconds = progress.updated - progress.since;
+  if (state != State::kWorking || seconds <= 0 || progress.done == 0) return std::nullopt;
+  return static_cast<double>(progress.done) / static_cast<double>(seconds);
+}
+
+std::optional<int64_t> ShareStatus::SecondsLeft() const {
+  const std::optional<double> rate = Rate();
+  if (!rate || !progress.left) return std::nullopt;
+  return static_cast<int64_t>(static_cast<double>(*progress.left) / *rate) + 1;
+}
+
+}  // namespace quarrox::ctl

@@ -1,0 +1,64 @@
+// How far the indexing of each share is, at one moment, and how people are told.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "fileindex/index_progress.h"
+
+namespace quarrox::ctl {
+
+struct ShareStatus {
+  enum class State {
+    kCurrent,   // nothing is pending
+    kPending,   // its queue is about to be worked on
+    kWorking,   // a pass is under way
+    kWaiting,   // for `reason` to pass
+    kPaused,    // by a person
+    kOutdated,  // its index misses something, and nothing is under way
+    kBlocked,   // it cannot be indexed
+  };
+
+  std::string name = {};
+  State state = State::kCurrent;
+  std::string reason = {};                 // where it is none of the first three, for people
+  bool rebuilding = false;                 // the pass under way makes the index anew
+  fileindex::IndexProgress progress = {};  // what its worker tells; empty where none runs
+  std::optional<uint64_t> documents = {};  // that searches can find; not known where the index cannot be asked
+  uint64_t queue_bytes = 0;                // that wait
+  std::optional<int64_t> queue_age = {};   // of the oldest of them, in seconds; none where there is no queue
+  std::string progress_file = {};          // empty for a share that is gone
+  std::vector<std::pair<std::string, std::string>> folders = {};  // paths, and the library's words for their states
+
+  // Whether anything is left to be done that is going to be done.
+  bool IsBusy() const;
+
+  // Documents a second in the pass under way, and the seconds that it still takes at that rate.
+  std::optional<double> Rate() const;
+  std::optional<int64_t> SecondsLeft() const;
+};
+
+struct IndexingStatus {
+  std::vector<ShareStatus> shares = {};    // in which folders are indexed, by name
+  std::vector<std::string> problems = {};  // that concern all of them, for people
+};
+
+// Looks at the machine, with one exchange with the engine. `with_folders` reads the queues, too.
+IndexingStatus LookAtIndexing(bool with_folders);
+
+// Everything as JSON on one line; what it does in words, without its name; the same with the number of its documents
+// or, while it is worked on, with a bar where `bar` is set.
+std::string AsJson(const ShareStatus& share);
+std::string Describe(const ShareStatus& share);
+std::string DescribeLong(const ShareStatus& share, bool bar);
+
+// Tables of the shares and their folders.
+void Print(const IndexingStatus& status);
+
+// Shows every change until a signal comes or, with `until_idle`, nothing is left to be done. Returns the exit status.
+int FollowStatus(bool until_idle, bool json);
+
+}  // namespace quarrox::ctl
