@@ -119,6 +119,16 @@ void IndexHandler::CheckEngine() const {
   throw Error(kErrEngineReceive, "The search engine was started anew meanwhile");
 }
 
+// From when on, in seconds since the epoch, what changed may not be what the last committed pass read; everything where
+// the clock was set back since then, nothing where there was no such pass.
+int64_t IndexHandler::ChangedSince() const {
+  struct stat info;
+  const bool is_after_another = stat(scope_.kinds_file().c_str(), &info) == 0;
+  errno = 0;
+  if (!is_after_another) return INT64_MAX;
+  return info.st_mtim.tv_sec > began_ ? INT64_MIN : info.st_mtim.tv_sec - kSlowestEvent;
+}
+
 void IndexHandler::Begin(const CheckPoint& check_point) {
   compared_.clear();
   refreshed_.clear();
@@ -134,10 +144,7 @@ void IndexHandler::Begin(const CheckPoint& check_point) {
   ReadFailures();
   kinds_ = scope_.kinds();
   began_ = time(nullptr);
-  struct stat kinds_info;
-  const bool is_after_another = stat(scope_.kinds_file().c_str(), &kinds_info) == 0;
-  errno = 0;
-  recent_ = is_after_another ? kinds_info.st_mtim.tv_sec - kSlowestEvent : INT64_MAX;
+  recent_ = ChangedSince();
   writer_.recent_reads().Begin(recent_, began_ - kSlowestEvent);
   check_point_ = [this, check_point] {
     const bool may_have_changed = check_point();

@@ -62,6 +62,7 @@ class IndexHandler final : public OperationHandler {
   bool NeedsReindex() const;
   bool HasOtherFolders();
   void ReadFailures();
+  int64_t ChangedSince() const;
   void TryAgain();
   void Reindex(const std::string& path);
   void ForgetStrangers(const std::string& path);

@@ -25,6 +25,11 @@ using fileindex::StatusMgr;
 // How long the first line of a burst waits for the others.
 constexpr std::chrono::milliseconds kBurst(200);
 
+// The same where nothing came for a while: people wait for what comes alone. Where it was the first of a burst, a short
+// pass is made for it, and the others wait as above.
+constexpr std::chrono::milliseconds kLoneLine(20);
+constexpr std::chrono::milliseconds kQuiet(400);
+
 // Unwinds a pass. They are no Error: nobody on the way is to handle them.
 struct Paused {};
 struct Interrupted {};
@@ -166,6 +171,7 @@ Worker::Outcome Worker::Drain() {
 }
 
 void Worker::WaitForQueue() {
+  const Clock::time_point began = Clock::now();
   const Clock::time_point next_work = DeadlineOf(handler_.NextWork());
   pollfd fds[1 + QueueWatch::kPollFds];
   do {
@@ -174,7 +180,8 @@ void Worker::WaitForQueue() {
     PollUntil(fds, std::size(fds), next_work);
     if (fds[0].revents != 0 || Clock::now() >= next_work) return;
   } while (!watch_->Reported(fds + 1));
-  PollUntil(fds, 1, Clock::now() + kBurst);
+  const Clock::time_point now = Clock::now();
+  PollUntil(fds, 1, now + (now - began < kQuiet ? kBurst : kLoneLine));
 }
 
 // Waits for the resume time by the clock that people set, also where that is set meanwhile.

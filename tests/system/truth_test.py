@@ -1,7 +1,8 @@
 #!/usr/bin/env python3
 """Whatever happens to files and daemons: once all is quiet, disk and index agree. FILEINDEX_LONG gives it full length.
 
-TRUTH_SEED    the first seed (1)
+TRUTH_SEED     the first seed (1)
+JUMPING_CLOCK  a library with which a daemon's clock is as many seconds ahead as the file CLOCK_OFFSET says
 """
 import collections
 import itertools
@@ -22,11 +23,11 @@ DAEMONS = {"VEXOELASTICD": ["--foreground", "--data", SCRATCH + "/engine"], "FIL
 
 
 class TruthTest(unittest.TestCase):
-    def restart(self, name, *more):
+    def restart(self, name, *more, **environment):
         if name in self.daemons:
             self.daemons[name].kill()
             self.daemons[name].wait()
-        self.daemons[name] = subprocess.Popen([os.environ[name], *DAEMONS[name], *more], stderr=self.log)
+        self.daemons[name] = subprocess.Popen([os.environ[name], *DAEMONS[name], *more], stderr=self.log, env={**os.environ, **environment})
 
     def setUp(self):
         self.addCleanup(subprocess.run, f"umount -lq {DOCS}; umount -lq {VOLUME}; umount -lq {SCRATCH}/disk", shell=True)
@@ -84,6 +85,18 @@ class TruthTest(unittest.TestCase):
                 self.restart(name)
                 files.step()
             self.expect_truth(files, -seed)
+
+    def test_a_clock_that_jumps(self):
+        """The daemons' own: the file system's goes on."""
+        for name in DAEMONS:
+            self.restart(name, LD_PRELOAD=os.environ["JUMPING_CLOCK"], CLOCK_OFFSET=SCRATCH + "/clock")
+        for seed in range(SEED, SEED + KILLS):
+            files = Files(DOCS, VOLUME + "/outside", seed, alike=False)
+            for seconds in 3600, -3 * 86400, 0, -10 ** 9, 3 * 10 ** 8, -1:
+                machine.write(SCRATCH + "/clock", str(seconds))
+                files.step(files.rng.randrange(40))
+                time.sleep(files.rng.random() * 0.4)
+            self.expect_truth(files, "clock %d" % seed)
 
     def test_a_full_disk_an_overflowing_kernel_queue_and_a_disk_that_comes_and_goes(self):
         files = Files(DOCS, VOLUME + "/outside", SEED, alike=False)
