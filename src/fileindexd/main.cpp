@@ -1,4 +1,5 @@
 #include <signal.h>
+#include <sys/prctl.h>
 #include <syslog.h>
 
 #include <cstdio>
@@ -25,6 +26,7 @@ int Run(const Options& options) {
     Daemon(quarrox::fileindex::kDaemonSocketPath, worker_options).Run();
     return 0;
   }
+  prctl(PR_SET_NAME, "fileindexd");  // a worker is started by the name of its file in /proc, which is "exe"
   IndexHandler handler(options.share);
   return Worker(options.share, handler, options.eager).Run();
 }

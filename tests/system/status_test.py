@@ -87,6 +87,10 @@ class StatusTest(unittest.TestCase):
         self.start(os.environ["VEXOELASTICD"], "--foreground", "--data", machine.SCRATCH + "/engine")
         self.start(os.environ["FILEINDEXD"], "--foreground")
         self.assertEqual(machine.ctl("folder", "add", "/photos", "/docs")[0], 0)
+        states = set()
+        while "current" not in states:
+            states.add(status()["photos"]["state"])
+        self.assertIn("working", states)
         self.assertEqual(self.follow("--until-idle").wait(60), 0)
         self.assertEqual([share["state"] for share in status().values()], ["current", "current"])
         self.assertEqual([share["documents"] for share in status().values()], [1, 3031])
