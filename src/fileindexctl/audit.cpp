@@ -161,8 +161,8 @@ class Auditor {
     Result result = Compare(share, json_, repair_);
     std::string left = left_before.empty() && !repair_ ? WorkLeftFor(share) : left_before;
     if (repair_ && result.differences != 0) {
-      std::cerr << "fileindexctl: " << result.differences << " differences in the share " << Visible(share)
-                << " are being mended\n";
+      std::cerr << "fileindexctl: the differences in the share " << Visible(share)
+                << " are being mended: " << result.differences << '\n';
       left = WaitForQuiet(share, wait_for_repair_);
       result = Compare(share, json_, false);
     }

@@ -98,6 +98,9 @@ void Judge(ShareStatus& share, const sdk::SDKShare& opened, bool is_paused, cons
   if (flags != 0) {
     return Set(share, State::kOutdated, "incomplete; 'fileindexctl folder reindex /" + share.name + "' mends it");
   }
+  if (!IsDirExist(opened.GetDBPath(), false)) {
+    Set(share, State::kOutdated, "not there; 'fileindexctl share rebuild " + share.name + "' makes it");
+  }
 }
 
 // False where there is no such share.

@@ -9,10 +9,12 @@
 #include <iterator>
 #include <utility>
 
+#include "common/comm.h"
 #include "common/error.h"
 #include "common/file.h"
 #include "common/log.h"
 #include "common/sdk/share.h"
+#include "fileindex/notices.h"
 #include "fileindex/queue_mgr.h"
 #include "fileindex/status_mgr.h"
 
@@ -162,6 +164,8 @@ Worker::Outcome Worker::Drain() {
     failure_ = error.reason;
     QUARROX_LOG_FAILURE("A pass over the queue of share %s failed, code=%d, reason=%.8192s", share_.c_str(), error.code,
                         error.reason.c_str());
+    const bool has_no_room = error.code == kErrNoSpace || int{error.code} == kElasticdNoRoom;
+    if (has_no_room && !std::exchange(no_room_told_, true)) fileindex::SendKOSNotify();
   } catch (const std::exception& error) {
     errno = 0;
     failure_ = error.what();
@@ -206,6 +210,7 @@ int Worker::Run() {
     switch (Drain()) {
       case Outcome::kDrained:
         backoff_.Reset();
+        no_room_told_ = false;
         progress_.Idle(handler_.tally());
         WaitForQueue();
         break;

@@ -59,6 +59,7 @@ class Worker {
   int64_t resume_time_ = 0;  // while paused, as StatusMgr::GetPauseInfo
   std::optional<QueueWatch> watch_;
   Backoff backoff_;
+  bool no_room_told_ = false;           // to the administrators, since the last pass that ended well
   std::string failure_;                 // why the last pass failed
   std::optional<uint64_t> operations_;  // that wait behind the one that is being handled
   ProgressReport progress_;

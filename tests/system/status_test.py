@@ -52,7 +52,10 @@ class StatusTest(unittest.TestCase):
     def test_each_share_says_what_keeps_it_and_one_that_is_gone_keeps_no_other(self):
         self.folders("/docs", "/paused", "/shut", "/gone")
         says = lambda *keys: [status()["docs"][key] for key in keys]
-        self.assertEqual([share["state"] for share in status().values()], ["current", "blocked", "paused", "blocked"])
+        self.assertEqual([share["state"] for share in status().values()], ["outdated", "blocked", "paused", "blocked"])
+        self.assertIn("share rebuild docs", *says("reason"))
+        os.makedirs(VOLUME / "@fileindex/docs/db")
+        self.assertEqual(says("state"), ["current"])
         self.tell(failed=5)
         self.assertEqual(says("state", "rate", "seconds_left", "failed"), ["working", 25, 31, 5])
         self.tell(pid=os.getpid())

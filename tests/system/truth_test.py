@@ -17,7 +17,7 @@ import private_machine as machine
 from random_files import Files
 
 SEED, PATIENCE = int(os.environ.get("TRUTH_SEED", "1")), 60  # seconds
-SEEDS, KILLS = (300, 50) if os.environ.get("FILEINDEX_LONG") else (2, 2)
+SEEDS, KILLS, MINUTES, MINUTE = (300, 50, 30, 60) if os.environ.get("FILEINDEX_LONG") else (2, 2, 2, 2)
 SCRATCH, VOLUME, DOCS, LOG = (machine.SCRATCH + place for place in ("", "/v", "/v/docs", "/log"))
 DAEMONS = {"VEXOELASTICD": ["--foreground", "--data", SCRATCH + "/engine"], "FILEINDEXD": ["--foreground"], "VEXONOTIFYD": ["--foreground"]}
 
@@ -85,6 +85,15 @@ class TruthTest(unittest.TestCase):
                 self.restart(name)
                 files.step()
             self.expect_truth(files, -seed)
+
+    def test_files_that_change_all_the_time_but_for_a_moment_each_minute(self):
+        files = Files(DOCS, VOLUME + "/outside", SEED, alike=False)
+        for minute in range(MINUTES):
+            end = time.monotonic() + MINUTE
+            while time.monotonic() < end:
+                files.step(files.rng.randrange(10))
+                time.sleep(files.rng.random() * 0.3)
+            self.expect_truth(files, "minute %d" % minute)
 
     def test_a_clock_that_jumps(self):
         """The daemons' own: the file system's goes on."""

@@ -16,6 +16,7 @@ enum ElasticdCode : int {
   kElasticdIndexRecovering = 608,
   kElasticdNoSuchIndex = 609,
   kElasticdIndexPaused = 610,
+  kElasticdNoRoom = 618,
   kElasticdOutOfMemory = 1400,
   kElasticdTooManyRequests = 1401
 };
