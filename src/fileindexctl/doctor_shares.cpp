@@ -16,7 +16,7 @@ namespace {
 // Removes all that there is of a share: at `place`, its directory, which is empty where it has none, and at the place
 // where it was before, which is known by what it left. Empty where there is neither.
 std::string RemoveCommand(const std::string& name, const std::string& place, Machine& machine) {
-  const std::string at_place = place.empty() ? "" : ShareCommand("clear-paused", name, place);
+  std::string at_place = place.empty() ? "" : ShareCommand("clear-paused", name, place);
   const auto stray = machine.strays().find(name);
   if (stray == machine.strays().end()) return at_place;
   const std::string command = ShareCommand("clear-paused", name, stray->second.share_path);
