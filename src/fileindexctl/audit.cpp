@@ -1,7 +1,5 @@
-#include <signal.h>
 #include <unistd.h>
 
-#include <cerrno>
 #include <chrono>
 #include <cstdint>
 #include <iostream>
@@ -27,6 +25,7 @@
 #include "fileindex/optree.h"
 #include "fileindex/status_mgr.h"
 #include "output.h"
+#include "status.h"
 
 namespace quarrox::ctl {
 namespace {
@@ -54,7 +53,7 @@ std::string WorkLeftFor(const std::string& name) {
   constexpr int kFlags = fileindex::kShareNeedReindex | fileindex::kShareNeedRebuild;
   if ((fileindex::StatusMgr().GetShareStatus(name) & kFlags) != 0) return "a reindex of it is due";
   const std::optional<IndexProgress> progress = IndexProgress::Load(IndexProgress::FileOf(share));
-  const bool is_told = progress && (kill(static_cast<pid_t>(progress->pid), 0) == 0 || errno == EPERM);
+  const bool is_told = progress && IsWorker(progress->pid);
   return is_told && progress->state != IndexProgress::State::kIdle ? "its worker is at work" : "";
 }
 

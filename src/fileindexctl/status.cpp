@@ -46,13 +46,6 @@ bool Listens(const char* path) {
          (errno != ENOENT && errno != ECONNREFUSED);
 }
 
-// What a worker told holds as long as it runs; its number may be another process's by now.
-bool IsWorker(int64_t pid) {
-  if (pid <= 0 || (kill(static_cast<pid_t>(pid), 0) != 0 && errno != EPERM)) return false;
-  std::string name;
-  return std::getline(std::ifstream("/proc/" + std::to_string(pid) + "/comm"), name) && name == "fileindexd";
-}
-
 // What concerns all shares.
 struct Machine {
   bool daemon_runs = Listens(fileindex::kDaemonSocketPath);
@@ -172,6 +165,12 @@ void AddFolders(IndexingStatus& status, const fileindex::FolderMgr& folders, sdk
 }
 
 }  // namespace
+
+bool IsWorker(int64_t pid) {
+  if (pid <= 0 || (kill(static_cast<pid_t>(pid), 0) != 0 && errno != EPERM)) return false;
+  std::string name;
+  return std::getline(std::ifstream("/proc/" + std::to_string(pid) + "/comm"), name) && name == "fileindexd";
+}
 
 IndexingStatus LookAtIndexing(bool with_folders) {
   const Machine machine;

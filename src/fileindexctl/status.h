@@ -46,6 +46,9 @@ struct IndexingStatus {
   std::vector<std::string> problems = {};  // that concern all of them, for people
 };
 
+// Whether a process is a worker, so that what it told of itself holds; its number may be another one's by now.
+bool IsWorker(int64_t pid);
+
 // Looks at the machine, with one exchange with the engine. `with_folders` reads the queues, too.
 IndexingStatus LookAtIndexing(bool with_folders);
 
