@@ -1,0 +1,79 @@
+#include "extract/findings.h"
+
+#include <algorithm>
+#include <cmath>
+#include <utility>
+
+#include <unicode/utf8.h>
+
+namespace platform::extract {
+namespace {
+
+constexpr std::string_view kReplacement = "\xef\xbf\xbd";
+
+bool IsControl(UChar32 c) {
+  return (c < 0x20 && c != '\n' && c != '\t') || c == 0x7f;
+}
+
+// Appends a text as UTF-8 without control characters, up to a length, cut between characters.
+void AppendClean(std::string_view text, size_t longest, std::string* out) {
+  const auto* const bytes = reinterpret_cast<const uint8_t*>(text.data());
+  const auto size = static_cast<int32_t>(std::min(text.size(), longest + U8_MAX_LENGTH));
+  for (int32_t at = 0; at < size;) {
+    const int32_t start = at;
+    UChar32 c = 0;
+    U8_NEXT(bytes, at, size, c);
+    const std::string_view character = c < 0 ? kReplacement
+                                       : IsControl(c)
+                                           ? std::string_view(" ")
+                                           : text.substr(static_cast<size_t>(start), static_cast<size_t>(at - start));
+    if (out->size() + character.size() > longest) return;
+    out->append(character);
+  }
+}
+
+std::string Cleaned(std::string_view text) {
+  std::string clean;
+  AppendClean(text, kLongestField, &clean);
+  constexpr const char* kBlanks = " \n\t";
+  const size_t first = clean.find_first_not_of(kBlanks);
+  if (first == std::string::npos) return {};
+  return clean.substr(first, clean.find_last_not_of(kBlanks) - first + 1);
+}
+
+}  // namespace
+
+bool Findings::AddText(std::string_view text) {
+  AppendClean(text, kLongestText, &text_);
+  return !IsFull();
+}
+
+void Findings::Set(const char* field, std::string_view text) {
+  if (Has(field)) return;
+  std::string clean = Cleaned(text);
+  if (!clean.empty()) fields_[field] = std::move(clean);
+}
+
+void Findings::Set(const char* field, int64_t number) {
+  if (!Has(field)) fields_[field] = Json::Int64{number};
+}
+
+void Findings::Set(const char* field, double number) {
+  if (!Has(field) && std::isfinite(number)) fields_[field] = number;
+}
+
+void Findings::Add(const char* field, std::string_view text) {
+  if (!Has(field)) return Set(field, text);
+  const std::string clean = Cleaned(text);
+  std::string all = fields_[field].asString();
+  if (clean.empty() || ("; " + all + "; ").find("; " + clean + "; ") != std::string::npos) return;
+  if (all.size() + clean.size() + 2 <= kLongestField) fields_[field] = all.append("; ").append(clean);
+}
+
+Json::Value Findings::Take() {
+  if (text_.find_first_not_of(" \n\t") != std::string::npos) fields_["VEXOMDTextContent"] = std::move(text_);
+  text_.clear();
+  return std::exchange(fields_, Json::Value(Json::objectValue));
+}
+
+}  // namespace platform::extract

@@ -1,0 +1,9 @@
+#include "extract/formats.h"
+
+namespace platform::extract {
+
+std::span<const Format> MediaFormats() {
+  return {};
+}
+
+}  // namespace platform::extract
