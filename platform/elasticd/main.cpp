@@ -40,6 +40,27 @@ sigset_t BlockSignals() {
   return signals;
 }
 
+// Stops the server when a signal says so. The thread ends with this object, also where the server failed.
+class Stopper {
+ public:
+  Stopper(const sigset_t& signals, Server& server)
+      : thread_([&signals, &server] {
+          int signal = 0;
+          sigwait(&signals, &signal);
+          sd_notify(0, "STOPPING=1");
+          server.Stop();
+        }) {}
+  ~Stopper() {
+    pthread_kill(thread_.native_handle(), SIGINT);
+    thread_.join();
+  }
+  Stopper(const Stopper&) = delete;
+  Stopper& operator=(const Stopper&) = delete;
+
+ private:
+  std::thread thread_;
+};
+
 // The socket comes first: who has it is the one engine on this machine. Clients are served once the engine is there.
 void Run(const Options& options) {
   const sigset_t signals = BlockSignals();
@@ -52,15 +73,11 @@ void Run(const Options& options) {
       },
       [](const std::string& reason) { return Engine::Refusal(kMalformedRequest, reason); });
   engine = std::make_unique<Engine>(options.data);
-  std::thread stopper([&] {
-    int signal = 0;
-    sigwait(&signals, &signal);
-    sd_notify(0, "STOPPING=1");
-    server.Stop();
-  });
-  sd_notify(0, "READY=1");
-  server.Run();
-  stopper.join();
+  {
+    const Stopper stopper(signals, server);
+    sd_notify(0, "READY=1");
+    server.Run();
+  }
   engine->Close();
 }
 

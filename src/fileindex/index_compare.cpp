@@ -16,6 +16,7 @@
 #include "common/log.h"
 #include "common/strings.h"
 #include "fileindex/elastic_control.h"
+#include "fileindex/index_rows.h"
 
 namespace quarrox::fileindex {
 namespace {
@@ -26,6 +27,9 @@ constexpr Json::ArrayIndex kPage = 100000;
 
 // Large enough that a request for them costs little, small enough that a signal need not wait.
 constexpr size_t kGoneAtOnce = 1000;
+
+// Entries that are looked at between two looks around: some tenths of a millisecond.
+constexpr uint64_t kEntriesAtOnce = 64;
 
 constexpr const char* kUsualFields[] = {"VEXOMDPath", "VEXOMDFSSize", "VEXOMDFSContentChangeDate",
                                         "VEXOMDAttributeChangeDate", "VEXOMDIsDir"};
@@ -72,11 +76,25 @@ OpenDirectory Open(const std::string& path) {
   return OpenDirectory(fd < 0 ? nullptr : fdopendir(fd));
 }
 
+// What follows the last "/" of a path.
+std::string NameOf(const std::string& path) {
+  return path.substr(path.rfind('/') + 1);
+}
+
 bool IsGone(int error) {
   return error == ENOENT || error == ENOTDIR || error == ELOOP;
 }
 
 }  // namespace
+
+IndexComparison::Directory& IndexComparison::DirectoryOf(const std::string& path) {
+  const std::string_view directory = std::string_view(path).substr(0, path.rfind('/') + 1);
+  if (last_documents_ == nullptr || directory != last_directory_) {
+    last_directory_ = directory;
+    last_documents_ = &documents_[last_directory_];
+  }
+  return *last_documents_;
+}
 
 void IndexComparison::Remember(const Json::Value& hit) {
   std::string path;
@@ -92,7 +110,16 @@ void IndexComparison::Remember(const Json::Value& hit) {
     document.has_its_names = HasItsNames(hit, path);
     document.access = AccessOf(hit);
   }
-  loaded_ += documents_.insert_or_assign(std::move(path), document).second ? 1 : 0;
+  loaded_ += DirectoryOf(path).insert_or_assign(NameOf(path), document).second ? 1 : 0;
+}
+
+void IndexComparison::Remember(ListedDocument&& listed) {
+  Document document;
+  document.size = listed.size;
+  document.changed = listed.changed;
+  document.attributes_changed = listed.attributes_changed;
+  document.is_directory = listed.is_directory;
+  loaded_ += DirectoryOf(listed.path).insert_or_assign(NameOf(listed.path), document).second ? 1 : 0;
 }
 
 void IndexComparison::Load(const char* kind, const std::string& text) {
@@ -111,13 +138,26 @@ void IndexComparison::Load(const char* kind, const std::string& text) {
   for (Json::ArrayIndex from = 0;; from += kPage) {
     differences_.CheckPoint();
     query["from"] = from;
-    Json::Value response;
-    SendRequestImpl(response, request);
-    const Json::Value& hits = std::as_const(response)["data"];
-    if (!hits.isArray()) throw Error(kErrEngineNoData, toString(response));
-    for (const Json::Value& hit : hits) Remember(hit);
-    if (hits.size() < kPage) return;
+    if (LoadPage(request) < kPage) return;
   }
+}
+
+// Returns how many elements the page has.
+size_t IndexComparison::LoadPage(const Json::Value& request) {
+  size_t elements = 0;
+  bool is_taken = false;
+  Json::Value response;
+  SendRequestImpl(response, request, [&](const std::string& text) {
+    is_taken =
+        care_ == Care::kUsual && ReadListing(
+                                     text, [this](ListedDocument&& listed) { Remember(std::move(listed)); }, elements);
+    return is_taken;
+  });
+  if (is_taken) return elements;
+  const Json::Value& hits = std::as_const(response)["data"];
+  if (!hits.isArray()) throw Error(kErrEngineNoData, toString(response));
+  for (const Json::Value& hit : hits) Remember(hit);
+  return hits.size();
 }
 
 // Whether only attributes can differ. What is in a directory changes its size and times without an event that tells of
@@ -136,12 +176,20 @@ bool IndexComparison::HasSameAttributes(const Document& document, const struct s
 }
 
 void IndexComparison::Visit(const std::string& path, const struct stat& info) {
-  const auto found = documents_.find(path);
-  if (found == documents_.end()) return differences_.Missing(path);
-  const Document document = std::move(found->second);
-  documents_.erase(found);
-  if (!IsSameFile(document, path, info)) return differences_.Changed(path);
-  if (!HasSameAttributes(document, info)) differences_.AttributesChanged(path, S_ISDIR(info.st_mode));
+  Directory& documents = DirectoryOf(path);
+  const auto found = documents.find(NameOf(path));
+  const bool is_missing = found == documents.end();
+  const Document document = is_missing ? Document() : std::move(found->second);
+  if (!is_missing) documents.erase(found);
+  const bool is_same = !is_missing && IsSameFile(document, path, info);
+  if (is_same && HasSameAttributes(document, info)) {
+    if (++met_ % kEntriesAtOnce == 0) differences_.CheckPoint();
+    return;
+  }
+  differences_.CheckPoint();
+  if (is_missing) return differences_.Missing(path);
+  if (!is_same) return differences_.Changed(path);
+  differences_.AttributesChanged(path, S_ISDIR(info.st_mode));
 }
 
 void IndexComparison::LeaveUnread(const std::string& path, int error) {
@@ -160,9 +208,7 @@ void IndexComparison::ReadEntry(int directory_fd, const dirent& entry, const std
     return;
   }
   if (S_ISDIR(info.st_mode)) return pending.push_back(path);
-  if (!IndexScope::AcceptsEntry(entry.d_name, info.st_mode)) return;
-  differences_.CheckPoint();
-  Visit(path, info);
+  if (IndexScope::AcceptsEntry(entry.d_name, info.st_mode)) Visit(path, info);
 }
 
 void IndexComparison::ReadDirectory(const std::string& directory, std::vector<std::string>& pending) {
@@ -193,7 +239,10 @@ void IndexComparison::Walk(const std::string& start) {
     pending.pop_back();
     const Entry entry = LookAt(path);
     if (entry.presence == Entry::kUnknown) LeaveUnread(path, entry.error);
-    if (entry.presence != Entry::kThere || !scope_.Accepts(path)) continue;
+    if (entry.presence != Entry::kThere) continue;
+    // What follows the start is an entry of a directory that was accepted.
+    const bool is_found = path != start && entry.IsDirectory();
+    if (!(is_found ? scope_.AcceptsDirectoryIn(path) : scope_.Accepts(path))) continue;
     Visit(path, entry.info);
     if (entry.IsDirectory()) ReadDirectory(path, pending);
   }
@@ -208,9 +257,12 @@ void IndexComparison::TellWhatWasNotMet() {
     differences_.Gone(gone);
     gone.clear();
   };
-  for (const auto& [path, document] : documents_) {
-    if (!HoldsAtOrAbove(unread_, path)) gone.push_back(path);
-    if (gone.size() == kGoneAtOnce) tell();
+  for (const auto& [directory, documents] : documents_) {
+    for (const auto& [name, document] : documents) {
+      std::string path = directory + name;
+      if (!HoldsAtOrAbove(unread_, path)) gone.push_back(std::move(path));
+      if (gone.size() == kGoneAtOnce) tell();
+    }
   }
   tell();
 }

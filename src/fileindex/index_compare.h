@@ -17,13 +17,15 @@ struct dirent;
 
 namespace quarrox::fileindex {
 
+struct ListedDocument;
+
 // Who is told of differences, one by one as they are found. Paths are full ones. What a method throws ends the
 // comparison.
 class QUARROX_API IndexDifferences {
  public:
   virtual ~IndexDifferences() = default;
 
-  // Comes between any two files and requests.
+  // Comes before each difference, request and directory, and otherwise every fraction of a millisecond.
   virtual void CheckPoint() = 0;
 
   virtual void Missing(const std::string& path) = 0;  // the index does not have it
@@ -67,8 +69,14 @@ class QUARROX_API IndexComparison {
     std::string access = {};  // the mode and the owners, where they are looked at
   };
 
+  // By name. Walks and listings go directory by directory, so that each is looked up once and its names lie together.
+  using Directory = std::unordered_map<std::string, Document>;
+
+  Directory& DirectoryOf(const std::string& path);
   void Load(const char* kind, const std::string& text);
+  size_t LoadPage(const Json::Value& request);
   void Remember(const Json::Value& hit);
+  void Remember(ListedDocument&& listed);
   void Walk(const std::string& start);
   void ReadDirectory(const std::string& directory, std::vector<std::string>& pending);
   void ReadEntry(int directory_fd, const dirent& entry, const std::string& path, std::vector<std::string>& pending);
@@ -83,8 +91,11 @@ class QUARROX_API IndexComparison {
   const IsForced is_forced_;
   const Care care_;
   uint64_t loaded_ = 0;
-  std::unordered_map<std::string, Document> documents_;  // those that were not met yet
-  PathSet unread_;                                       // directories and files that cannot be looked at
+  uint64_t met_ = 0;                                      // that do not differ
+  std::unordered_map<std::string, Directory> documents_;  // those that were not met yet, by directory
+  std::string last_directory_;
+  Directory* last_documents_ = nullptr;  // of it
+  PathSet unread_;                       // directories and files that cannot be looked at
 };
 
 }  // namespace quarrox::fileindex

@@ -96,6 +96,11 @@ bool IndexScope::Accepts(const std::string& path) const {
   return Covers(path) && CanFullPathBeIndexed(path);
 }
 
+bool IndexScope::AcceptsDirectoryIn(const std::string& path) const {
+  OpenShares shares;
+  return Covers(path) && JudgeEntry(path, shares).rule == kPathAccepted;
+}
+
 bool IndexScope::AcceptsEntry(const std::string& name, mode_t mode) {
   return !S_ISLNK(mode) && !IsSystemPreservedFileName(name);
 }

@@ -56,7 +56,8 @@ class QUARROX_API IndexScope {
   // Whether the path is to be in the index. Throws Error 502 or 800 where that cannot be told.
   bool Accepts(const std::string& path) const;
 
-  // The same for an entry, other than a directory, of a directory that is accepted.
+  // The same for a directory in one that was just accepted, and for any other entry of such a one.
+  bool AcceptsDirectoryIn(const std::string& path) const;
   static bool AcceptsEntry(const std::string& name, mode_t mode);
 
   // Whether what is in the file is to be in the index, too.

@@ -8,6 +8,7 @@
 
 #include "common/log.h"
 #include "common/sdk/share.h"
+#include "common/strings.h"
 #include "vexo/filesystem.h"
 #include "vexo/recycle.h"
 #include "vexo/share.h"
@@ -148,7 +149,8 @@ PathVerdict JudgeFullPath(const std::string& full_path) {
   return JudgeFullPath(full_path, shares);
 }
 
-PathVerdict JudgeFullPath(const std::string& full_path, OpenShares& shares) {
+// All but what the path's text decides.
+PathVerdict JudgePlace(const std::string& full_path, OpenShares& shares) {
   if (IsInSnapshot(full_path)) return {kPathInSnapshot};
   if (PathVerdict verdict = JudgeFileSystem(full_path); verdict.rule != kPathAccepted) return verdict;
   std::string name;
@@ -159,8 +161,19 @@ PathVerdict JudgeFullPath(const std::string& full_path, OpenShares& shares) {
   if (IsInRecycleBin(full_path, name)) return {kPathInRecycleBin};
   // Where an encrypted share is unlocked, its own directory is a mount point, and its files are to be indexed.
   if (VEXOFSDirIsMntPoint(full_path.c_str()) == 1 && !share.IsEncryption()) return {kPathIsMountPoint};
+  return {};
+}
+
+PathVerdict JudgeFullPath(const std::string& full_path, OpenShares& shares) {
+  if (PathVerdict verdict = JudgePlace(full_path, shares); verdict.rule != kPathAccepted) return verdict;
   if (const std::string reserved = FindReservedName(full_path); !reserved.empty()) return {kPathReservedName, reserved};
   return JudgeCanonical(full_path);
+}
+
+PathVerdict JudgeEntry(const std::string& full_path, OpenShares& shares) {
+  if (PathVerdict verdict = JudgePlace(full_path, shares); verdict.rule != kPathAccepted) return verdict;
+  const std::string name = Basename(full_path);
+  return IsReserved(name.c_str()) ? PathVerdict{kPathReservedName, name} : PathVerdict{};
 }
 
 bool CanFullPathBeIndexed(const std::string& full_path) {

@@ -61,6 +61,10 @@ struct PathVerdict {
 QUARROX_API PathVerdict JudgeFullPath(const std::string& full_path);
 QUARROX_API PathVerdict JudgeFullPath(const std::string& full_path, OpenShares& shares);
 
+// The same for an entry, no symbolic link, of a directory that was just accepted: all of its path but the last
+// component is known to be right then, and not resolved once more.
+QUARROX_API PathVerdict JudgeEntry(const std::string& full_path, OpenShares& shares);
+
 // For people and programs: the rule's name in one word, why the path is refused, and what to do about it. All are empty
 // for an accepted path.
 QUARROX_API std::string PathRuleName(PathRule rule);

@@ -53,6 +53,10 @@ ItemResult ReadItem(const Json::Value& item) {
 }  // namespace
 
 void SendRequestImpl(Json::Value& res, const Json::Value& req) {
+  SendRequestImpl(res, req, [](const std::string&) { return false; });
+}
+
+void SendRequestImpl(Json::Value& res, const Json::Value& req, const TakeResponse& take) {
   const std::string text = toString(req);  // before connecting, so that the engine need not wait for it
   WaitForSocket();
   vexodaemon::DomainSockConnection conn(kElasticdSocketPath);
@@ -62,7 +66,9 @@ void SendRequestImpl(Json::Value& res, const Json::Value& req) {
   if (!conn.Send(text)) QUARROX_THROW("!conn.Send(req.toString())", kErrEngineReceive, "Send failed");
 
   std::string resp_raw;
-  if (!conn.Recv(resp_raw) || !fromString(res, resp_raw) || !res.isObject() || !res.isMember("success") ||
+  const bool is_received = conn.Recv(resp_raw);
+  if (is_received && take(resp_raw)) return;
+  if (!is_received || !fromString(res, resp_raw) || !res.isObject() || !res.isMember("success") ||
       !res["success"].isBool()) {
     QUARROX_THROW(
         "!conn.Recv(resp_raw) || !res.fromString(resp_raw) || !res.isMember(\"success\") || "

@@ -1,6 +1,9 @@
 // The request channel to the search engine: one JSON request, one JSON response.
 #pragma once
 
+#include <functional>
+#include <string>
+
 #include <json/json.h>
 
 #include "common/export.h"
@@ -35,5 +38,11 @@ inline bool IsElasticdBusy(int code) {
 // ("Request failed, msg=" and its message) or an item was refused because it is busy (its message); 120 where a
 // refusal is malformed. Any thread may call; callers that hold a lock keep it for that time.
 QUARROX_API void SendRequestImpl(Json::Value& res, const Json::Value& req);
+
+// Takes a response as the text that it came as; false where it is to be read as ever.
+using TakeResponse = std::function<bool(const std::string& text)>;
+
+// The same for large responses: where `take` took it, `res` stays as it was.
+QUARROX_API void SendRequestImpl(Json::Value& res, const Json::Value& req, const TakeResponse& take);
 
 }  // namespace quarrox
