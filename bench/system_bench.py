@@ -1,7 +1,10 @@
 #!/usr/bin/env python3
-"""The whole system on real text files, beside recollindex on the same files.
+"""The whole system on real files, beside recollindex on the same files.
 
-    FILEINDEX_BUILD_DIR=build/release python3 bench/system_bench.py [--small]
+    FILEINDEX_BUILD_DIR=build/release python3 bench/system_bench.py [--media] [--small]
+
+The files are text; with --media a twelfth more of them are documents, mail, sound, pictures and video, and only passes are
+measured: then the other's helper programs are to be installed, too.
 
 Runs on a private machine (tests/system/private_machine.py), with files and indexes on the disk that holds the build
 directory. Processor time is that of all processes of a system; memory is the sum of the peaks of our daemons, and the
@@ -24,9 +27,10 @@ import sys
 import time
 
 sys.path.insert(0, str(pathlib.Path(__file__).resolve().parent.parent / "tests/system"))
+import media_corpus
 import private_machine as machine
 
-SMALL = "--small" in sys.argv
+SMALL, MEDIA = "--small" in sys.argv, "--media" in sys.argv
 FILES, RENAMED, CHANGED, TRIES, IDLE = (1200, 500, 20, 10, 5) if SMALL else (24000, 10000, 100, 100, 60)
 BUILD = pathlib.Path(os.environ.get("FILEINDEX_BUILD_DIR", "build/release")).resolve()
 ROOT = BUILD / "system_bench"
@@ -98,10 +102,11 @@ def holds(path):
     return len(ask({"id": "fileindex_docs", "query": query}).get("data", [])) == 1
 
 
-def below(directory):
-    """How many files the index holds below a directory."""
-    answer = ask({"id": "fileindex_docs", "query": {"qsl": {"prefix": {"VEXOMDPath": f"{directory}/"}}, "load_field": ["VEXOMDIsDir"]}})
-    return sum(not document["VEXOMDIsDir"] for document in answer.get("data", []))
+def below(directory, end=""):
+    """How many files the index holds below a directory, of those whose names end so."""
+    fields = ["VEXOMDIsDir", "VEXOMDPath"]
+    answer = ask({"id": "fileindex_docs", "query": {"qsl": {"prefix": {"VEXOMDPath": f"{directory}/"}}, "load_field": fields}})
+    return sum(not document["VEXOMDIsDir"] and document["VEXOMDPath"].endswith(end) for document in answer.get("data", []))
 
 
 class Ours:
@@ -134,19 +139,17 @@ class Ours:
         subprocess.run([PROGRAMS["fileindexctl"], *arguments], check=True, stdout=subprocess.DEVNULL)
 
     def pids(self):
-        return [pid for daemon in self.daemons for pid in (daemon.pid, *self.children(daemon.pid))]
+        """Of all our processes, children behind their parents."""
+        pids = [daemon.pid for daemon in self.daemons]
+        for pid in pids:
+            for thread in pathlib.Path(f"/proc/{pid}/task").iterdir():
+                pids.extend(map(int, (thread / "children").read_text().split()))
+        return pids
 
     def cpu(self):
-        seconds = 0.0
-        for daemon in self.daemons:
-            for pid in [daemon.pid, *self.children(daemon.pid)]:
-                fields = pathlib.Path(f"/proc/{pid}/stat").read_text().rsplit(")", 1)[1].split()
-                seconds += sum(map(int, fields[11:15 if pid == daemon.pid else 13])) / TICKS
-        return seconds
-
-    @staticmethod
-    def children(pid):
-        return list(map(int, pathlib.Path(f"/proc/{pid}/task/{pid}/children").read_text().split()))
+        """With that of children that ended."""
+        fields = (pathlib.Path(f"/proc/{pid}/stat").read_text().rsplit(")", 1)[1].split() for pid in self.pids())
+        return sum(sum(map(int, values[11:15])) for values in fields) / TICKS
 
     def peak(self):
         """Of the memory, in MiB."""
@@ -244,7 +247,8 @@ def compare(volume, docs):
     report("  processor time", full[1], theirs[1])
     report("  peak memory", ours.peak(), recoll.peak / 1024, "MiB")
     report("  disk", disk(volume / "@fileindex", ROOT / "engine"), disk(recoll.config / "xapiandb"), "MiB")
-    print(f"{'  files that both hold':46} {below(docs):9d}      {recoll.count('mime:text/plain'):9d}")
+    for kind in ["txt", *(kind for kind, _ in media_corpus.SHARES if MEDIA)]:
+        print(f"{f'  {kind} files that both hold':46} {below(docs, '.' + kind):9d}      {recoll.count('ext:' + kind):9d}")
 
     def a_pass(what, change, done):
         change()
@@ -262,6 +266,8 @@ def compare(volume, docs):
         daemon.send_signal(signal.SIGCONT)
     ours.until(ours.idle)
 
+    if MEDIA:
+        return ours
     moved = len(list((docs / "bulk").rglob("*.txt")))
     ours.rest()
     name = next((docs / "bulk").rglob("*.txt")).relative_to(docs / "bulk")
@@ -318,13 +324,19 @@ def main():
     docs = volume / "docs"
     count, size = make_corpus(docs, FILES)
     print(f"{count} text files, {size / 1e6:.0f} MB")
+    if MEDIA:
+        texts = (data.decode() for path, data in text_files())
+        count, size = media_corpus.make(docs / "media", count // 12, texts)
+        print(f"{count} other files, {size / 1e6:.0f} MB")
     print(f"{'':46} {'ours':>13} {'recollindex':>13}  ratio", flush=True)
     try:
         ours = compare(volume, docs)
-        latency(ours, docs)
-        idle(ours)
+        if not MEDIA:
+            latency(ours, docs)
+            idle(ours)
         ours.stop()
-        growth(volume, docs)
+        if not MEDIA:
+            growth(volume, docs)
     finally:
         for daemon in DAEMONS:
             daemon.kill()

@@ -4,6 +4,7 @@
 
 #include <cerrno>
 #include <filesystem>
+#include <fstream>
 #include <system_error>
 
 #include <json/json.h>
@@ -19,7 +20,12 @@ namespace quarrox::elasticd {
 namespace {
 
 // What belongs to an index in its directory. Others keep files there, too.
-constexpr const char* kOwnNames[] = {"index", "index.damaged", "index.moving", "closed.json"};
+constexpr const char* kOwnNames[] = {"index", "index.damaged", "index.moving", "closed.json", "CACHEDIR.TAG"};
+
+// Tells programs that back up files that these can be made again: https://bford.info/cachedir/
+constexpr char kCacheTag[] =
+    "Signature: 8a477f597d28d172789f06886806bc55\n"
+    "# A full-text index, made from the files of a shared folder. Delete it with: fileindexctl folder delete\n";
 
 [[noreturn]] void Fail(const std::error_code& error, const std::string& what) {
   const bool no_room = error == std::errc::no_space_on_device || error.value() == EDQUOT;
@@ -66,6 +72,8 @@ bool IndexFiles::Exists() const {
 
 void IndexFiles::MakeDirectory() const {
   MakeDirectories(path_);
+  // Without it the index is only backed up.
+  if (std::ofstream tag(path_ + "/CACHEDIR.TAG"); !(tag << kCacheTag)) errno = 0;
 }
 
 bool IndexFiles::WasClosedInOrder() const {

@@ -16,7 +16,7 @@ build_depends() {
     [ -n "$package" ] || continue
     if [ "$which" = build ]; then
       case "$rest" in *'<!nocheck>'*) continue ;; esac
-      case "$package" in debhelper*) continue ;; esac
+      case "$package" in debhelper* | dh-*) continue ;; esac
     fi
     echo "$package"
   done

@@ -48,7 +48,8 @@ class PackagingTest(unittest.TestCase):
             self.assertIn("\n  %s " % name, run(CTL, "--help"))
             self.assertEqual(re.findall(r"^  --\S+(?: [A-Z]\S*)? *$", run(CTL, *name.split(), "-h"), re.MULTILINE), [])
         os.environ["MANROFFOPT"] = "-z"  # nothing but warnings
-        self.assertEqual(run("man", "--warnings", "-E", "UTF-8", "-l", "-Tutf8", installed("fileindexctl.1")), "")
+        for page in ("fileindexctl.1", "fileindex.5", "fileindexd.8", "vexoelasticd.8", "vexonotifyd.8"):
+            self.assertEqual(run("man", "--warnings", "-E", "UTF-8", "-l", "-Tutf8", installed(page)), "")
         self.assertIn("did you mean 'folder list'?", run(CTL, "foldr", "lst"))
 
     def test_bash_completes_options_shares_and_folders(self):
