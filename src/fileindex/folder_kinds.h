@@ -1,6 +1,7 @@
 // The kinds of files whose contents the folders of a share index.
 #pragma once
 
+#include <cstdint>
 #include <map>
 #include <optional>
 #include <string>
@@ -38,15 +39,31 @@ struct QUARROX_API Kinds {
 // The folders of one share with their kinds. They are written down beside the index when it was made with them, so that
 // a change of the folder list is seen also where the event that tells of it was lost or came to be part of another one.
 // Paths are taken from the share's directory, whose own is empty, so that they outlive a rename of the share.
+//
+// Nothing is looked at in a folder while it is paused. What is written down of its places says how they were indexed
+// before, and since when, in seconds since the epoch, what changed there may have been missed.
 class QUARROX_API FolderKinds {
  public:
-  void Add(const std::string& path, const Kinds& kinds) { folders_.emplace(path, kinds); }
+  struct Difference {
+    std::string path;
+    Kinds kinds;                          // in which something is indexed otherwise
+    std::optional<int64_t> unseen_since;  // where it was paused
+  };
+
+  void Add(const std::string& path, const Kinds& kinds, bool is_paused = false) {
+    folders_.emplace(path, Entry{kinds, is_paused ? std::optional<int64_t>(INT64_MIN) : std::nullopt});
+  }
 
   // Of the nearest folder at or above a path, if there is one.
   std::optional<Kinds> At(const std::string& path) const;
 
-  // The places from which on, downwards, something is indexed otherwise, with the kinds in which it is.
-  std::vector<std::pair<std::string, Kinds>> DifferencesFrom(const FolderKinds& other) const;
+  // Those of an index that was made with `before` and is brought in line with these: at places that are paused now, it
+  // stays as it was. What was not paused before is unseen since `since`.
+  FolderKinds After(const FolderKinds& before, int64_t since) const;
+
+  // The places from which on, downwards, there is something to be done, because something is indexed otherwise or is
+  // not paused any more.
+  std::vector<Difference> DifferencesFrom(const FolderKinds& other) const;
 
   bool operator==(const FolderKinds&) const = default;
 
@@ -56,7 +73,20 @@ class QUARROX_API FolderKinds {
   void Save(const std::string& file) const;
 
  private:
-  std::map<std::string, Kinds> folders_;
+  struct Entry {
+    Kinds kinds;
+    std::optional<int64_t> unseen_since;  // while it is paused
+
+    bool operator==(const Entry& other) const {
+      return kinds == other.kinds && unseen_since.has_value() == other.unseen_since.has_value();
+    }
+  };
+  using Folders = std::map<std::string, Entry>;
+
+  static Folders PlacesOf(const FolderKinds& a, const FolderKinds& b);
+  const Entry* Find(const std::string& path) const;
+
+  Folders folders_;
 };
 
 // Whether a path is one of some directories or lies below one, by whole components.

@@ -11,6 +11,7 @@
 #include "common/sdk/credentials.h"
 #include "common/strings.h"
 #include "fileindex/folder_mgr_table.h"
+#include "fileindex/folder_pauses.h"
 #include "fileindex/util.h"
 #include "vexo/unicode.h"
 
@@ -71,6 +72,9 @@ void FolderMgr::Save() const {
   if (-1 == chmod(kFileIndexFoldersCfgPath, kListMode)) {
     QUARROX_THROW("-1 == chmod(kFileIndexFoldersCfgPath, 0644)", kErrSystem, kFileIndexFoldersCfgPath);
   }
+  FolderPauses pauses;
+  pauses.KeepOnly(GetFolders());
+  pauses.Save();
 }
 
 void FolderMgr::Get(std::shared_ptr<Folder>& folder, const std::string& path) const {

@@ -34,9 +34,9 @@ class QUARROX_API FolderMgr {
   FolderMgr(const FolderMgr&) = delete;
   FolderMgr& operator=(const FolderMgr&) = delete;
 
-  // Writes the list as root, mode 0644, with the directories above it where they are missing; the process is who it was
-  // again afterwards. Throws Error 503 where it may not be root, 505 where the file cannot be written, 502 where its
-  // mode cannot be set.
+  // Writes the list as root, mode 0644, with the directories above it where they are missing, and drops from
+  // FolderPauses what it does not hold any more; the process is who it was again afterwards. Throws Error 503 where it
+  // may not be root, 505 where a file cannot be written, 502 where the list's mode cannot be set.
   void Save() const;
 
   // The first folder with exactly this share path. Get throws Error 902 where there is none.

@@ -100,6 +100,7 @@ void IndexComparison::Remember(const Json::Value& hit) {
   std::string path;
   if (hit.isObject()) GetJsonValue(path, hit, "VEXOMDPath", false);
   if (path.empty()) return;
+  if (scope_.IsPaused(path)) return void(++loaded_);
   Document document;
   document.size = NumberOf(hit, "VEXOMDFSSize");
   document.changed = NumberOf(hit, "VEXOMDFSContentChangeDate");
@@ -114,6 +115,7 @@ void IndexComparison::Remember(const Json::Value& hit) {
 }
 
 void IndexComparison::Remember(ListedDocument&& listed) {
+  if (scope_.IsPaused(listed.path)) return void(++loaded_);
   Document document;
   document.size = listed.size;
   document.changed = listed.changed;
@@ -200,6 +202,7 @@ void IndexComparison::LeaveUnread(const std::string& path, int error) {
 // A directory goes to `pending`.
 void IndexComparison::ReadEntry(int directory_fd, const dirent& entry, const std::string& path,
                                 std::vector<std::string>& pending) {
+  if (scope_.IsPaused(path)) return;
   if (entry.d_type == DT_DIR) return pending.push_back(path);
   struct stat info;
   if (fstatat(directory_fd, entry.d_name, &info, AT_SYMLINK_NOFOLLOW | AT_NO_AUTOMOUNT) != 0) {

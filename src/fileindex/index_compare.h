@@ -51,8 +51,9 @@ class QUARROX_API IndexComparison {
   IndexComparison(const IndexScope& scope, IndexDifferences& differences, IsForced is_forced, Care care = Care::kUsual)
       : scope_(scope), differences_(differences), is_forced_(std::move(is_forced)), care_(care) {}
 
-  // The share's own directory stands for the whole index. Throws what the engine and `differences` throw, and Error 502
-  // where the share's directory goes away meanwhile; nothing is told to be gone then.
+  // The share's own directory stands for the whole index. What is paused is left out. Throws what the engine and
+  // `differences` throw, and Error 502 where the share's directory goes away meanwhile; nothing is told to be gone
+  // then.
   void Run(const std::string& path);
 
   // Those that the index has.

@@ -11,6 +11,7 @@
 // process may switch its effective user to root for single calls.
 #pragma once
 
+#include <cstdint>
 #include <string>
 
 #include <json/json.h>
@@ -79,6 +80,17 @@ QUARROX_API void FolderDelete(const std::string& share_name);
 // the request is no array of strings, or one can be no path; what is before it is then queued already.
 QUARROX_API void FolderReindex(const Json::Value& path_list);
 
+// Pauses one folder, but not the folders that lie in it: its files are not looked at until it is resumed, and searches
+// go on to find what was indexed before. `resume_time` is when it ends, in seconds since the epoch; 0: without end.
+// FolderResume has it compared with the disk; without a pause it does nothing. Under the folder lock. Both throw Error
+// 902 where there is no folder at this path, 120 for a negative time and where the folder's share is paused.
+QUARROX_API void FolderPause(const std::string& path, int64_t resume_time);
+QUARROX_API void FolderResume(const std::string& path);
+
+// Resumes the folders of a share whose pauses have come to their end, for the share's worker. Takes the folder lock
+// where there are such. What fails there is logged only; throws what reading the list throws.
+QUARROX_API void EndFolderPauses(const std::string& share_name);
+
 // --- shares --------------------------------------------------------------------------------------------------------
 
 // Each follows, or leads, a change of a share on the machine. None takes the folder lock: the caller holds it. An empty
@@ -96,8 +108,8 @@ QUARROX_API void ShareMigrate(const std::string& share_name, const std::string& 
 // is missing. An empty name is no share's.
 QUARROX_API void ShareCheckRecycle(const std::string& share_name);
 
-// Stops indexing in a share: the daemon's worker, the notifications, the index. ShareResume is the way back. Both do
-// nothing for a share without folders, and save the list last.
+// Stops indexing in a share: the daemon's worker, the notifications, the index. ShareResume is the way back, also for
+// folders that were paused before. Both do nothing for a share without folders, and save the list last.
 QUARROX_API void SharePause(const std::string& share_name);
 QUARROX_API void ShareResume(const std::string& share_name);
 

@@ -28,13 +28,6 @@ using FolderPtr = std::shared_ptr<Folder>;
 
 constexpr char kUpsert[] = "FolderUpsert";
 
-void notify_setting_changed(const std::string& share_name, bool is_upsert) {
-  Json::Value data(Json::objectValue);
-  data["share_name"] = share_name;
-  data["is_upsert"] = is_upsert;
-  SendCommandToDaemon("notify_setting_changed", data);
-}
-
 // Has the daemon look at what changed in each folder; an entry may be empty.
 void QueueUpdates(const std::vector<FolderPtr>& folders, OpenShares& shares) {
   CustomEvents events(shares);
@@ -201,6 +194,13 @@ void Rebuild(const std::string& share, OpenShares& shares, CustomEvents& events)
 }
 
 }  // namespace
+
+void notify_setting_changed(const std::string& share_name, bool is_upsert) {
+  Json::Value data(Json::objectValue);
+  data["share_name"] = share_name;
+  data["is_upsert"] = is_upsert;
+  SendCommandToDaemon("notify_setting_changed", data);
+}
 
 void RequirePossible(const char* operation, const std::string& path) {
   if (path.size() >= PATH_MAX) {

@@ -31,6 +31,9 @@ class MonitorConfigs {
   std::unordered_map<std::string, std::vector<std::shared_ptr<Folder>>> folders_;  // by share
 };
 
+// Tells the daemon that the folders of a share are others than before.
+void notify_setting_changed(const std::string& share_name, bool is_upsert);
+
 // Switches on or off what indexing needs of the machine: the SMB service's search, content extraction (never off) and
 // the indexing daemon. Failures are logged and not thrown.
 void SetupRelatedServices(bool enable);

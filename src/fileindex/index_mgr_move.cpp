@@ -11,6 +11,7 @@
 #include "common/log.h"
 #include "common/sdk/share.h"
 #include "common/strings.h"
+#include "fileindex/folder_pauses.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/index_mgr_internal.h"
 #include "fileindex/optree.h"
@@ -33,9 +34,10 @@ bool IsIndexedShareAt(const std::string& path, const FolderMgr& folder_mgr) {
 }
 
 bool IsWatched(const std::string& share_name, const FolderMgr& folder_mgr) {
+  const FolderPauses pauses;
   const auto& folders = folder_mgr.GetFolders();
   return std::any_of(folders.begin(), folders.end(),
-                     [&](const auto& folder) { return folder->GetShare() == share_name && !folder->IsPaused(); });
+                     [&](const auto& folder) { return folder->GetShare() == share_name && pauses.IsServed(*folder); });
 }
 
 // Adds from where the queues of a place say that the directory came there.

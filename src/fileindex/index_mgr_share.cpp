@@ -5,6 +5,7 @@
 #include "common/log.h"
 #include "fileindex/communication.h"
 #include "fileindex/elastic_control.h"
+#include "fileindex/folder_pauses.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/index_mgr_internal.h"
 #include "fileindex/optree.h"
@@ -26,9 +27,13 @@ void ChangePaused(const std::string& share_name, bool paused) {
   OpenShares shares;
   MonitorConfigs monitors(folder_mgr, shares);
   paused ? PauseShare(share_name, monitors) : ResumeShare(share_name, monitors);
+  FolderPauses pauses;
   for (const auto& folder : folder_mgr.GetFolders()) {
-    if (folder->GetShare() == share_name) folder->SetPaused(paused);
+    if (folder->GetShare() != share_name) continue;
+    folder->SetPaused(paused);
+    pauses.Forget(folder->GetPath());
   }
+  pauses.Save();
   folder_mgr.Save();
 }
 
@@ -66,6 +71,9 @@ void ShareRename(const std::string& share_from, const std::string& share_to) {
   for (const auto& folder : folder_mgr.GetFolders()) {
     if (folder->GetShare() == share_from) folder->SetShare(share_to);
   }
+  FolderPauses pauses;
+  pauses.RenameShare(share_from, share_to);
+  pauses.Save();
   folder_mgr.Save();
   OpenShares shares;
   const sdk::SDKShare& share = shares.Get(share_to);

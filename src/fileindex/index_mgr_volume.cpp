@@ -7,6 +7,7 @@
 #include "common/log.h"
 #include "common/strings.h"
 #include "fileindex/elastic_control.h"
+#include "fileindex/folder_pauses.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/index_mgr_internal.h"
 
@@ -73,10 +74,13 @@ void VolumePause(const std::string& mount_point) {
   OpenShares shares;
   const std::set<std::string> names = SharesOn(volume, folder_mgr, shares);
   if (names.empty()) return;
+  FolderPauses pauses;
   ChangeFolders(folder_mgr, names, [&](Folder& folder) {
     folder.SetVolumeToBeClean(volume);
     folder.SetPaused(true);
+    pauses.Forget(folder.GetPath());
   });
+  pauses.Save();
   folder_mgr.Save();
   MonitorConfigs monitors(folder_mgr, shares);
   for (const std::string& name : names) PauseShare(name, monitors);

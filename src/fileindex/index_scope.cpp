@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
+#include <ctime>
 
 #include "common/error.h"
 #include "common/file.h"
@@ -13,6 +14,7 @@
 #include "common/log.h"
 #include "common/sdk/share.h"
 #include "common/strings.h"
+#include "fileindex/folder_pauses.h"
 #include "fileindex/queue_mgr_search.h"
 #include "fileindex/util.h"
 
@@ -59,19 +61,31 @@ void IndexScope::Read() {
   for (const std::string& other : folders->GetIndexedShares()) {
     if (other != share_) folders->DeleteByShare(other);
   }
-  FolderKinds kinds;
-  for (const auto& folder : folders->GetFolders()) {
-    const std::string path = folder->GetFullPath();
-    if (IsAtOrBelow(path, share.GetPath())) {
-      kinds.Add(path.substr(share.GetPath().size()), Kinds::Of(folder->GetIndexCfg()));
-    }
-  }
   directory_ = share.GetPath();
-  kinds_ = std::move(kinds);
+  folders_ = std::move(folders);
+  TakeFolders();
   kinds_file_ = Dirname(share.GetDBPath()) + "/kinds";
   device_ = info.st_dev;
   inode_ = info.st_ino;
-  folders_ = std::move(folders);
+}
+
+// Of several folders at one place the first counts.
+void IndexScope::TakeFolders() {
+  const FolderPauses pauses;
+  const int64_t now = time(nullptr);
+  kinds_ = {};
+  paused_.clear();
+  next_resume_.reset();
+  for (const auto& folder : folders_->GetFolders()) {
+    const std::string path = folder->GetFullPath();
+    if (!IsAtOrBelow(path, directory_) || folders_->GetMostSuitableCfg(path) != folder) continue;
+    const bool is_paused = pauses.IsPausedAt(*folder, now);
+    kinds_.Add(path.substr(directory_.size()), Kinds::Of(folder->GetIndexCfg()), is_paused);
+    if (!is_paused) continue;
+    paused_.insert(path);
+    const int64_t end = pauses.EndOf(*folder).value_or(0);
+    if (end != 0) next_resume_ = std::min(end, next_resume_.value_or(end));
+  }
 }
 
 void IndexScope::NoteDisk() const {
@@ -105,16 +119,28 @@ bool IndexScope::AcceptsEntry(const std::string& name, mode_t mode) {
   return !S_ISLNK(mode) && !IsSystemPreservedFileName(name);
 }
 
-std::vector<std::string> IndexScope::Starts(const std::string& path) const {
-  if (Covers(path)) return {path};
-  std::vector<std::string> folders;
-  for (const auto& folder : folders_->GetFolders()) {
-    if (IsAtOrBelow(folder->GetFullPath(), path)) folders.push_back(folder->GetFullPath());
-  }
-  std::sort(folders.begin(), folders.end());  // a folder in another one comes behind it
+bool IndexScope::IsPaused(const std::string& path) const {
+  if (paused_.empty()) return false;
+  const auto folder = FolderOf(path);
+  return folder != nullptr && paused_.contains(folder->GetFullPath());
+}
+
+bool IndexScope::HasPaused(const std::string& path) const {
+  if (IsPaused(path)) return true;
+  const auto below = paused_.upper_bound(path + '/');
+  return below != paused_.end() && below->starts_with(path + '/');
+}
+
+std::vector<std::string> IndexScope::Starts(const std::string& path, Paused paused) const {
+  const auto is_met = [&](const std::string& place) {
+    return Covers(place) && (paused == Paused::kToo || !IsPaused(place));
+  };
   PathSet starts;
-  for (const std::string& folder : folders) {
-    if (!HoldsAtOrAbove(starts, folder)) starts.insert(folder);
+  if (is_met(path)) starts.insert(path);
+  for (const auto& folder : folders_->GetFolders()) {
+    const std::string place = folder->GetFullPath();
+    if (place == path || !IsAtOrBelow(place, path)) continue;
+    if (is_met(place) && !is_met(Dirname(place))) starts.insert(place);
   }
   return {starts.begin(), starts.end()};
 }

@@ -4,7 +4,10 @@
 #include <sys/stat.h>
 #include <sys/types.h>
 
+#include <cstdint>
 #include <memory>
+#include <optional>
+#include <set>
 #include <string>
 #include <utility>
 #include <vector>
@@ -26,9 +29,8 @@ struct Entry {
 };
 QUARROX_API Entry LookAt(const std::string& path);
 
-// A path is indexed where a folder covers it and nothing speaks against it. A folder counts also while its record says
-// that it is paused: whoever pauses a share ends its worker first, and starts it before the records are unmarked;
-// taking the paths of a paused folder for not indexed would then empty the index.
+// A path is indexed where a folder covers it and nothing speaks against it. A folder counts also while it is paused:
+// what the index has of it stays. Files that it governs are not looked at then, but those of folders below it are.
 //
 // It holds the share and the folder list as they were when they were last read. Not thread-safe.
 class QUARROX_API IndexScope {
@@ -72,10 +74,28 @@ class QUARROX_API IndexScope {
   // The file beside the index that takes the folders with which it was made.
   const std::string& kinds_file() const { return kinds_file_; }
 
-  // Where walks begin that together meet everything covered at a path and below it, each once.
-  std::vector<std::string> Starts(const std::string& path) const;
+  // The folder that governs a path; null where none does.
+  std::shared_ptr<Folder> FolderOf(const std::string& path) const { return folders_->GetMostSuitableCfg(path); }
+
+  // Whether the path is not to be looked at, because the folder that governs it is paused; whether that holds for it or
+  // for something below it.
+  bool IsPaused(const std::string& path) const;
+  bool HasPaused(const std::string& path) const;
+
+  // The folders of the share that are paused, full paths.
+  const std::set<std::string>& paused() const { return paused_; }
+
+  // When the first of their pauses ends, in seconds since the epoch; nothing where none does.
+  std::optional<int64_t> next_resume() const { return next_resume_; }
+
+  // Where walks begin that together meet everything covered at a path and below it, each once, if they do not go into
+  // what is paused. kToo: if they do.
+  enum class Paused { kNot, kToo };
+  std::vector<std::string> Starts(const std::string& path, Paused paused = Paused::kNot) const;
 
  private:
+  void TakeFolders();
+
   const std::string share_;
   std::string directory_;
   dev_t device_ = 0;
@@ -83,6 +103,8 @@ class QUARROX_API IndexScope {
   bool has_own_disk_ = false;
   std::string disk_note_;  // stands where it has one
   std::unique_ptr<FolderMgr> folders_;
+  std::set<std::string> paused_;
+  std::optional<int64_t> next_resume_;
   FolderKinds kinds_;
   std::string kinds_file_;
 };

@@ -132,6 +132,9 @@ struct Result {
 Result Compare(const std::string& share, bool json, bool repair) {
   fileindex::IndexScope scope(share);
   scope.Read();
+  for (const std::string& folder : scope.paused()) {
+    std::cerr << "fileindexctl: the folder " << Visible(folder) << " is paused, so it is left out\n";
+  }
   // A file whose folder's kinds are others than when the index was made has more or less of its contents there.
   const FolderKinds before = FolderKinds::Load(scope.kinds_file()).value_or(scope.kinds());
   const auto is_forced = [&](const std::string& path, const struct stat& info) {

@@ -1,5 +1,6 @@
 // `call`: any operation that the library exports, by its name, for scripts that have no command of their own for it.
 #include <cstddef>
+#include <cstdint>
 #include <functional>
 #include <iostream>
 #include <string>
@@ -43,7 +44,7 @@ template <typename T>
 const char* KindOf() {
   if (std::is_same_v<T, std::string>) return "a string";
   if (std::is_same_v<T, bool>) return "true or false";
-  if (std::is_same_v<T, int>) return "a whole number";
+  if (std::is_same_v<T, int> || std::is_same_v<T, int64_t>) return "a whole number";
   return std::is_same_v<T, unsigned int> ? "a whole number that is not negative" : "an array";
 }
 
@@ -106,6 +107,8 @@ const std::vector<Operation>& Operations() {
       Question("FolderChange", fileindex::FolderChange, "path", "changes"),
       Change<const Json::Value&>("FolderDelete", fileindex::FolderDelete, "path_list"),
       Change<const std::string&>("FolderDeleteByShare", fileindex::FolderDelete, "share_name"),
+      Change("FolderPause", fileindex::FolderPause, "path", "resume_time"),
+      Change("FolderResume", fileindex::FolderResume, "path"),
       Change("FolderReindex", fileindex::FolderReindex, "path_list"),
       Change("ShareRename", fileindex::ShareRename, "share_from", "share_to"),
       Change("ShareMigrate", fileindex::ShareMigrate, "share_name", "path_from", "path_to"),

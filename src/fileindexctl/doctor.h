@@ -73,7 +73,7 @@ class Machine {
   // under the empty name.
   const std::map<std::string, FolderList>& folders();
 
-  // Whether all folders of a share are paused.
+  // Whether a share is paused: all of its folders are, and none by itself.
   bool IsPaused(const std::string& share);
 
   // The shares in which folders are indexed, as far as they are there: configured, and with a directory of their name.

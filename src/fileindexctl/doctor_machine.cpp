@@ -11,6 +11,7 @@
 #include "common/strings.h"
 #include "doctor.h"
 #include "fileindex/folder_mgr.h"
+#include "fileindex/folder_pauses.h"
 
 namespace fs = std::filesystem;
 
@@ -57,7 +58,8 @@ const std::map<std::string, Machine::FolderList>& Machine::folders() {
 
 bool Machine::IsPaused(const std::string& share) {
   const FolderList& list = folders().at(share);
-  return std::all_of(list.begin(), list.end(), [](const auto& folder) { return folder->IsPaused(); });
+  const fileindex::FolderPauses pauses;
+  return std::none_of(list.begin(), list.end(), [&](const auto& folder) { return pauses.IsServed(*folder); });
 }
 
 bool Machine::IsServed(const std::string& share) {

@@ -16,6 +16,7 @@
 #include "doctor.h"
 #include "fileindex/communication.h"
 #include "fileindex/folder_mgr.h"
+#include "fileindex/folder_pauses.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/status_mgr.h"
 
@@ -90,6 +91,7 @@ void CheckRights(Machine& machine, Findings& findings) {
   std::vector<Rule> rules = {{Dirname(fileindex::kFileIndexFoldersCfgPath), 0755, 0022, "0755"},
                              {fileindex::kFileIndexFoldersCfgPath, 0644, 0022, "0644"},
                              {fileindex::kFileIndexStatusCfgPath, 0644, 0022, "0644"},
+                             {fileindex::kFolderPausesPath, 0644, 0022, "0644"},
                              {kMonitorDirectory, 0700, 0022, "0755"}};
   for (const Rule& rule : rules) CheckRule(rule, findings);
   for (const std::string& name : machine.served()) {

@@ -2,6 +2,7 @@
 
 #include <ctime>
 #include <iostream>
+#include <memory>
 #include <optional>
 #include <string>
 
@@ -12,7 +13,9 @@
 #include "common/json.h"
 #include "common/sdk/share.h"
 #include "common/sdk/share_path.h"
+#include "fileindex/folder_pauses.h"
 #include "fileindex/index_failures.h"
+#include "fileindex/index_scope.h"
 #include "fileindex/queue_mgr.h"
 #include "fileindex/util.h"
 #include "output.h"
@@ -28,6 +31,7 @@ struct Fate {
   std::optional<bool> is_pending = std::nullopt;
   std::optional<bool> is_indexed = std::nullopt;
   std::optional<fileindex::IndexFailure> failure = std::nullopt;
+  std::shared_ptr<fileindex::Folder> paused = nullptr;  // the folder that it is in, where that is paused
 };
 
 struct Explanation {
@@ -79,6 +83,17 @@ std::optional<bool> IsIndexed(const sdk::SDKShare& share, const std::string& pat
   }
 }
 
+// Null where it is not paused, or that cannot be told.
+std::shared_ptr<fileindex::Folder> PausedFolderOf(const std::string& path, const std::string& share) {
+  fileindex::IndexScope scope(share);
+  try {
+    scope.Read();
+    return scope.IsPaused(path) ? scope.FolderOf(path) : nullptr;
+  } catch (const Error&) {
+    return nullptr;
+  }
+}
+
 Fate FateOf(const std::string& path, const std::string& share_name) {
   const sdk::SDKShare share(share_name);
   Fate fate;
@@ -88,6 +103,7 @@ Fate FateOf(const std::string& path, const std::string& share_name) {
     // It was logged why.
   }
   fate.is_indexed = IsIndexed(share, path);
+  fate.paused = PausedFolderOf(path, share_name);
   const fileindex::IndexFailures failures(fileindex::IndexFailures::FileOf(share));
   if (const auto* failure = failures.Find(path.substr(share.GetPath().size()))) fate.failure = *failure;
   return fate;
@@ -131,6 +147,7 @@ void PrintJson(const Explanation& explanation) {
   Describe(explanation.refusal, object);
   object["pending"] = AsJson(explanation.fate.is_pending);
   object["indexed"] = AsJson(explanation.fate.is_indexed);
+  object["paused"] = explanation.fate.paused != nullptr;
   object["failure"] = explanation.fate.failure ? AsJson(*explanation.fate.failure) : Json::Value();
   std::cout << toString(object) << '\n';
 }
@@ -146,11 +163,19 @@ std::string TimeOf(time_t time) {
   return text;
 }
 
+void PrintPause(const fileindex::Folder& folder) {
+  const std::optional<int64_t> end = fileindex::FolderPauses().EndOf(folder);
+  std::cout << "paused     "
+            << Visible(!end ? "with its share " + folder.GetShare() : folder.GetPath() + " is " + DescribePause(*end))
+            << '\n';
+}
+
 void Print(const Fate& fate) {
   const std::optional<fileindex::IndexFailure>& failure = fate.failure;
   const bool lacks_contents = failure && failure->has_document && fate.is_indexed.value_or(false);
   std::cout << "pending    " << Describe(fate.is_pending) << '\n';
   std::cout << "indexed    " << Describe(fate.is_indexed) << (lacks_contents ? ", without its contents" : "") << '\n';
+  if (fate.paused != nullptr) PrintPause(*fate.paused);
   if (!failure) return;
   const std::optional<int64_t> next = failure->NextTry();
   std::cout << "failed     " << TimeOf(failure->tried) << ": " << Visible(failure->reason) << " (code " << failure->code

@@ -6,11 +6,9 @@
 #include <vector>
 
 #include "command.h"
-#include "common/error.h"
 #include "common/json.h"
-#include "common/sdk/share.h"
-#include "common/strings.h"
 #include "fileindex/folder_mgr.h"
+#include "fileindex/folder_pauses.h"
 #include "output.h"
 #include "typed_path.h"
 
@@ -19,6 +17,7 @@ namespace {
 
 using fileindex::Folder;
 using fileindex::FolderMgr;
+using fileindex::FolderPauses;
 
 const std::vector<std::string>& SortKeys() {
   static const std::vector<std::string> keys = {"path", "name", "document", "audio", "video", "photo"};
@@ -43,25 +42,26 @@ void PrintRow(const char* name, const std::string& value) {
   std::cout << name << Visible(value) << '\n';
 }
 
-void PrintFolder(const Folder& folder) {
+std::string PausedText(const Folder& folder, const FolderPauses& pauses) {
+  const int64_t end = pauses.EndOf(folder).value_or(0);
+  return end == 0 ? YesNo(folder.IsPaused()) : "until " + LocalTime(end);
+}
+
+void PrintFolder(const Folder& folder, const FolderPauses& pauses) {
   PrintRow("path        ", folder.GetPath());
   PrintRow("name        ", folder.GetName());
   PrintRow("types       ", TypesOf(folder));
   PrintRow("group       ", folder.GetGroup());
   PrintRow("owner       ", folder.GetOwner());
   PrintRow("privileged  ", YesNo(folder.IsPrivileged()));
-  PrintRow("paused      ", YesNo(folder.IsPaused()));
+  PrintRow("paused      ", PausedText(folder, pauses));
 }
 
-// The share path of the folder that a person means. Throws Error 902 where there is none, and says which folder governs
-// what lies below one.
-std::string FolderPath(const FolderMgr& folder_mgr, const std::string& typed) {
-  if (folder_mgr.HasFolder(typed)) return typed;  // also in a share that is gone
-  std::string path = AsSharePath(typed, sdk::SDKShare::Enum());
-  if (folder_mgr.HasFolder(path)) return path;
-  std::string above = Dirname(path);
-  while (!above.empty() && !folder_mgr.HasFolder(above)) above = Dirname(above);
-  throw Error(kErrNoSuchFolder, above.empty() ? path : path + "; it is governed by the folder " + above);
+// "resume_time" says until when a folder is paused by itself, 0 for without end.
+Json::Value AsJson(const Folder& folder, const FolderPauses& pauses) {
+  Json::Value data = folder.GetData();
+  if (const auto end = pauses.EndOf(folder)) data["resume_time"] = Json::Int64{*end};
+  return data;
 }
 
 }  // namespace
@@ -77,14 +77,15 @@ int FolderList(const Arguments& arguments) {
   size_t total = 0;
   FolderMgr().List(folders, total, offset, limit, sort_by, arguments.Has("--desc") ? "desc" : "asc",
                    arguments.Value("--group", fileindex::kAll), arguments.Value("--keyword", ""));
+  const FolderPauses pauses;
   if (arguments.Has("--json")) {
-    for (const auto& folder : folders) std::cout << toString(folder->GetData()) << '\n';
+    for (const auto& folder : folders) std::cout << toString(AsJson(*folder, pauses)) << '\n';
     return kDone;
   }
   std::vector<std::vector<std::string>> rows = {{"PATH", "NAME", "TYPES", "GROUP", "PAUSED"}};
   for (const auto& folder : folders) {
     rows.push_back({Visible(folder->GetPath()), Visible(folder->GetName()), TypesOf(*folder),
-                    Visible(folder->GetGroup()), YesNo(folder->IsPaused())});
+                    Visible(folder->GetGroup()), PausedText(*folder, pauses)});
   }
   if (rows.size() > 1) PrintTable(std::cout, rows);
   std::cout.flush();
@@ -99,9 +100,9 @@ int FolderGet(const Arguments& arguments) {
   std::shared_ptr<Folder> folder;
   folder_mgr.Get(folder, path);
   if (arguments.Has("--json")) {
-    std::cout << toString(folder->GetData()) << '\n';
+    std::cout << toString(AsJson(*folder, FolderPauses())) << '\n';
   } else {
-    PrintFolder(*folder);
+    PrintFolder(*folder, FolderPauses());
   }
   return kDone;
 }

@@ -54,17 +54,18 @@ std::string Duration(int64_t seconds) {
   return std::to_string(seconds) + " s";
 }
 
+std::string LocalTime(int64_t time) {
+  const time_t seconds = time;
+  tm local = {};
+  char text[64] = "";
+  if (localtime_r(&seconds, &local) != nullptr) strftime(text, sizeof(text), "%F %T %Z", &local);
+  return text;
+}
+
 // A time that has passed says that indexing runs again.
 std::string DescribePause(int64_t resume_time) {
   if (resume_time == fileindex::kPausedWithoutEnd) return "paused without end";
-  const time_t end = resume_time;
-  tm local = {};
-  char text[64];
-  if (end <= time(nullptr) || localtime_r(&end, &local) == nullptr ||
-      strftime(text, sizeof(text), "%F %T %Z", &local) == 0) {
-    return "running";
-  }
-  return std::string("paused until ") + text;
+  return resume_time <= time(nullptr) ? "running" : "paused until " + LocalTime(resume_time);
 }
 
 void PrintTable(std::ostream& out, const std::vector<std::vector<std::string>>& rows) {

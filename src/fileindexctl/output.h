@@ -20,6 +20,9 @@ std::string Duration(int64_t seconds);
 // The state of pausing, by what StatusMgr says of it: "paused until 2026-11-21 11:52:35 UTC", "running".
 std::string DescribePause(int64_t resume_time);
 
+// "2026-11-21 11:52:35 UTC", in the machine's time zone.
+std::string LocalTime(int64_t time);
+
 // Rows of equally many texts, the first of which is the heading. Columns are as wide as their widest text.
 void PrintTable(std::ostream& out, const std::vector<std::vector<std::string>>& rows);
 

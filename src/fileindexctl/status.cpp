@@ -11,6 +11,7 @@
 #include <cstring>
 #include <ctime>
 #include <fstream>
+#include <map>
 #include <set>
 #include <utility>
 
@@ -23,6 +24,7 @@
 #include "fileindex/communication.h"
 #include "fileindex/elastic_control.h"
 #include "fileindex/folder_mgr.h"
+#include "fileindex/folder_pauses.h"
 #include "fileindex/folder_status.h"
 #include "fileindex/queue_mgr.h"
 #include "fileindex/status_mgr.h"
@@ -50,6 +52,7 @@ bool Listens(const char* path) {
 struct Machine {
   bool daemon_runs = Listens(fileindex::kDaemonSocketPath);
   fileindex::StatusMgr status = {};
+  fileindex::FolderPauses pauses = {};
   int64_t resume_time = status.GetPauseInfo();
   int64_t now = time(nullptr);
 
@@ -152,7 +155,8 @@ void CountDocuments(IndexingStatus& status, sdk::OpenShares& opened) {
   for (ShareStatus* share : shares) Ask({share});
 }
 
-void AddFolders(IndexingStatus& status, const fileindex::FolderMgr& folders, sdk::OpenShares& shares) {
+void AddFolders(IndexingStatus& status, const Machine& machine, const fileindex::FolderMgr& folders,
+                sdk::OpenShares& shares) {
   fileindex::FolderStatuses statuses(folders, shares);
   for (const auto& folder : folders.GetFolders()) {
     const std::string name = folder->GetShare();
@@ -160,7 +164,8 @@ void AddFolders(IndexingStatus& status, const fileindex::FolderMgr& folders, sdk
     if (share == status.shares.end() || share->name != name) continue;
     Json::Value text;
     statuses.GetStatus(text, *folder);
-    share->folders.emplace_back(folder->GetPath(), folder->IsPaused() ? "paused" : text["text"].asString());
+    share->folders.push_back(
+        {folder->GetPath(), folder->IsPaused() ? "paused" : text["text"].asString(), machine.pauses.EndOf(*folder)});
   }
 }
 
@@ -175,15 +180,18 @@ bool IsWorker(int64_t pid) {
 IndexingStatus LookAtIndexing(bool with_folders) {
   const Machine machine;
   fileindex::FolderMgr folders;
-  std::set<std::string> active;
+  std::set<std::string> served;
+  std::map<std::string, size_t> paused;
   for (const auto& folder : folders.GetFolders()) {
-    if (!folder->IsPaused()) active.insert(folder->GetShare());
+    if (machine.pauses.IsServed(*folder)) served.insert(folder->GetShare());
+    if (folder->IsPaused()) ++paused[folder->GetShare()];
   }
   IndexingStatus status;
   sdk::OpenShares shares;
   for (const std::string& name : folders.GetIndexedShares()) {
     ShareStatus& share = status.shares.emplace_back(ShareStatus{.name = name});
-    if (!LookAt(share, !active.contains(name), machine, shares)) folders.DeleteByShare(name);
+    if (served.contains(name)) share.paused_folders = paused[name];
+    if (!LookAt(share, !served.contains(name), machine, shares)) folders.DeleteByShare(name);
   }
   if (!machine.daemon_runs) status.problems.emplace_back("fileindexd is not running, so nothing is indexed");
   try {
@@ -191,7 +199,7 @@ IndexingStatus LookAtIndexing(bool with_folders) {
   } catch (const Error& error) {
     status.problems.push_back("the search engine, vexoelasticd, does not work: " + error.reason);
   }
-  if (with_folders) AddFolders(status, folders, shares);
+  if (with_folders) AddFolders(status, machine, folders, shares);
   return status;
 }
 

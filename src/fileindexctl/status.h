@@ -4,7 +4,6 @@
 #include <cstdint>
 #include <optional>
 #include <string>
-#include <utility>
 #include <vector>
 
 #include "fileindex/index_progress.h"
@@ -31,7 +30,14 @@ struct ShareStatus {
   uint64_t queue_bytes = 0;                // that wait
   std::optional<int64_t> queue_age = {};   // of the oldest of them, in seconds; none where there is no queue
   std::string progress_file = {};          // empty for a share that is gone
-  std::vector<std::pair<std::string, std::string>> folders = {};  // paths, and the library's words for their states
+  size_t paused_folders = 0;               // while the share is not
+
+  struct Folder {
+    std::string path;
+    std::string status;                  // the library's word
+    std::optional<int64_t> resume_time;  // while it is paused by itself, as StatusMgr has it of all
+  };
+  std::vector<Folder> folders = {};
 
   // Whether anything is left to be done that is going to be done.
   bool IsBusy() const;

@@ -40,6 +40,11 @@ std::string Pending(const ShareStatus& share) {
   return SizeText(share.queue_bytes) + " of changes, the oldest " + Duration(*share.queue_age) + " old";
 }
 
+std::string PausedFolders(const ShareStatus& share) {
+  if (share.paused_folders == 0) return {};
+  return ", with " + Grouped(share.paused_folders) + (share.paused_folders == 1 ? " folder" : " folders") + " paused";
+}
+
 std::string FolderWords(const std::string& status) {
   static const std::map<std::string, std::string> words = {{"finished", "up to date"},
                                                            {"processing", "being indexed"},
@@ -81,7 +86,7 @@ std::string Describe(const ShareStatus& share) {
   const uint64_t failed = share.progress.failed;
   switch (share.state) {
     case State::kCurrent:
-      return failed == 0 ? "up to date" : "up to date, but " + Documents(failed) + " failed";
+      return "up to date" + (failed == 0 ? "" : ", but " + Documents(failed) + " failed") + PausedFolders(share);
     case State::kPending:
       return "pending: " + pending;
     case State::kWorking:
@@ -121,10 +126,11 @@ std::string AsJson(const ShareStatus& share) {
   object["queue_bytes"] = Json::UInt64{share.queue_bytes};
   object["queue_seconds"] = OrNull(share.queue_age);
   object["folders"] = Json::Value(Json::arrayValue);
-  for (const auto& [path, status] : share.folders) {
-    Json::Value& folder = object["folders"].append(Json::Value(Json::objectValue));
-    folder["path"] = path;
-    folder["status"] = status;
+  for (const ShareStatus::Folder& folder : share.folders) {
+    Json::Value& data = object["folders"].append(Json::Value(Json::objectValue));
+    data["path"] = folder.path;
+    data["status"] = folder.status;
+    if (folder.resume_time) data["resume_time"] = Json::Int64{*folder.resume_time};
   }
   return toString(object);
 }
@@ -135,7 +141,10 @@ void Print(const IndexingStatus& status) {
   for (const ShareStatus& share : status.shares) {
     shares.push_back(
         {Visible(share.name), share.documents ? Grouped(*share.documents) : "unknown", Visible(Describe(share))});
-    for (const auto& [path, state] : share.folders) folders.push_back({Visible(path), FolderWords(state)});
+    for (const ShareStatus::Folder& folder : share.folders) {
+      folders.push_back(
+          {Visible(folder.path), folder.resume_time ? DescribePause(*folder.resume_time) : FolderWords(folder.status)});
+    }
   }
   if (shares.size() == 1) {
     std::cout << "no folder is indexed; 'fileindexctl folder add' adds one\n";

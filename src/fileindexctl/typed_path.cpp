@@ -3,6 +3,8 @@
 #include "command.h"
 #include "common/error.h"
 #include "common/file.h"
+#include "common/sdk/share.h"
+#include "common/strings.h"
 #include "fileindex/util.h"
 
 namespace quarrox::ctl {
@@ -29,6 +31,15 @@ std::string AsSharePath(const std::string& typed, const std::set<std::string>& s
   } catch (const Error&) {
     return path;
   }
+}
+
+std::string FolderPath(const fileindex::FolderMgr& folder_mgr, const std::string& typed) {
+  if (folder_mgr.HasFolder(typed)) return typed;  // also in a share that is gone
+  std::string path = AsSharePath(typed, sdk::SDKShare::Enum());
+  if (folder_mgr.HasFolder(path)) return path;
+  std::string above = Dirname(path);
+  while (!above.empty() && !folder_mgr.HasFolder(above)) above = Dirname(above);
+  throw Error(kErrNoSuchFolder, above.empty() ? path : path + "; it is governed by the folder " + above);
 }
 
 }  // namespace quarrox::ctl

@@ -37,13 +37,15 @@ void Daemon::TakeSignals() {
 }
 
 // A paused share gets no worker by itself, and one that is running is not taken away: pausing a share deletes its
-// worker before it marks the folders, and resuming it creates the worker before it unmarks them.
+// worker before it marks the folders, and resuming it creates the worker before it unmarks them, of which it is told.
 void Daemon::FollowFolders() {
   const auto& shares = indexed_.shares();
-  for (const auto& [share, active] : shares) {
-    const auto order = orders_.find(share);
-    if (order == orders_.end() ? active : order->second) pool_.Start(share);
+  for (const auto& [name, share] : shares) {
+    const auto order = orders_.find(name);
+    if (order == orders_.end() ? share.is_served : order->second) pool_.Start(name);
+    if (share.paused != std::exchange(paused_[name], share.paused)) pool_.Tell(name);
   }
+  std::erase_if(paused_, [&](const auto& paused) { return shares.count(paused.first) == 0; });
   for (const std::string& share : pool_.Shares()) {
     if (shares.count(share) == 0) pool_.End(share);
   }

@@ -41,9 +41,10 @@ class Daemon {
   CommandSocket socket_;
   WorkerPool pool_;
   IndexedShares indexed_;
-  QueueWatch folders_;                  // not every change of the list comes with a command
-  std::map<std::string, bool> orders_;  // shares whose worker was created or deleted by a command
-  Clock::time_point look_at_ = {};      // when the folder list is due, kNever while it has been read
+  QueueWatch folders_;                    // not every change of the list comes with a command
+  std::map<std::string, bool> orders_;    // shares whose worker was created or deleted by a command
+  std::map<std::string, size_t> paused_;  // folders of each share
+  Clock::time_point look_at_ = {};        // when the folder list is due, kNever while it has been read
   Backoff look_backoff_;
   Clock::time_point stop_at_ = kNever;  // while stopping
 };

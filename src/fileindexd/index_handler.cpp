@@ -80,7 +80,16 @@ bool IndexHandler::NeedsReindex() const {
 
 bool IndexHandler::HasWork() {
   ReadFailures();
-  return NeedsReindex() || !failures_.Due(time(nullptr)).empty() || HasOtherFolders();
+  const int64_t now = time(nullptr);
+  const bool is_resumed = scope_.next_resume().value_or(INT64_MAX) <= now;
+  return is_resumed || NeedsReindex() || !failures_.Due(now).empty() || HasOtherFolders();
+}
+
+std::optional<int64_t> IndexHandler::NextWork() const {
+  const std::optional<int64_t> next_try = failures_.NextTry();
+  const std::optional<int64_t> next_resume = scope_.next_resume();
+  if (!next_try || !next_resume) return next_try ? next_try : next_resume;
+  return std::min(*next_try, *next_resume);
 }
 
 // Whether the index was made with other folders than those of now. The list is read only when it has changed, and no
@@ -97,7 +106,10 @@ bool IndexHandler::HasOtherFolders() {
     return false;  // what cannot be looked at now is looked at when something happens
   }
   const std::optional<FolderKinds> before = FolderKinds::Load(scope_.kinds_file());
-  if (before && *before != scope_.kinds() && committed_kinds_ != scope_.kinds()) return true;
+  if (before) {
+    const FolderKinds after = scope_.kinds().After(*before, 0);
+    if (after != *before && after != committed_kinds_) return true;
+  }
   folders_seen_ = list;
   return false;
 }
@@ -140,21 +152,15 @@ void IndexHandler::Begin(const CheckPoint& check_point) {
   to_look_at_.reset();
   writer_.Reset();
   engine_ = LookAtEngine();
+  fileindex::EndFolderPauses(scope_.share());
   scope_.Read();
   ReadFailures();
-  kinds_ = scope_.kinds();
+  begun_with_ = scope_.kinds();
   began_ = time(nullptr);
+  if (!tried_since_) tried_since_ = began_;
   recent_ = ChangedSince();
   writer_.recent_reads().Begin(recent_, began_ - kSlowestEvent);
-  check_point_ = [this, check_point] {
-    const bool may_have_changed = check_point();
-    if (!may_have_changed) return false;
-    // What was found right under the old settings is looked at again.
-    scope_.Read();
-    compared_.clear();
-    writer_.Forget();
-    return true;
-  };
+  check_point_ = [this, check_point] { return check_point() && LookAgain(); };
   former_places_ = fileindex::FindFormerPlaces(scope_.share());
   if (!former_places_.empty()) WithIndex([this] { FollowMoves(); });
   if (NeedsReindex()) {
@@ -167,12 +173,26 @@ void IndexHandler::Begin(const CheckPoint& check_point) {
   TryAgain();
 }
 
-// What does not fail once more is no failure any more.
+// The settings may have changed. What was found right under the old ones is looked at again.
+bool IndexHandler::LookAgain() {
+  const bool had_paused = !scope_.paused().empty();
+  scope_.Read();
+  if ((had_paused || !scope_.paused().empty()) && scope_.kinds() != begun_with_) throw StartAnew();
+  compared_.clear();
+  writer_.Forget();
+  return true;
+}
+
+// What does not fail once more is no failure any more. In a paused folder it is put off.
 void IndexHandler::TryAgain() {
   const int64_t now = time(nullptr);
   for (const std::string& place : failures_.Due(now)) {
     const fileindex::IndexFailure* failure = failures_.Find(place);
     if (failure == nullptr || !failure->IsDue(now)) continue;  // it was met on the way
+    if (IsPausedPlace(place)) {
+      failures_.Note(place, fileindex::IndexFailure(*failure));
+      continue;
+    }
     const uint32_t tries = failure->tries;
     check_point_();
     WithIndex([&] { Create(scope_.directory() + place); });
@@ -182,15 +202,17 @@ void IndexHandler::TryAgain() {
 }
 
 // A comparison that somebody asked for: what failed is tried again whatever it was.
-void IndexHandler::Reindex(const std::string& path) {
+void IndexHandler::Reindex(const std::string& path, const Kinds& forced) {
   std::vector<std::string> failed;
-  if (const std::optional<std::string> place = writer_.PlaceOf(path)) {
-    failed = failures_.AtOrBelow(*place);
-    failures_.ForgetBelow(*place);
+  if (const std::optional<std::string> place = writer_.PlaceOf(path)) failed = failures_.AtOrBelow(*place);
+  std::erase_if(failed, [this](const std::string& place) { return IsPausedPlace(place); });
+  for (const std::string& place : failed) {
+    failures_.Forget(place);
+    writer_.Forget(scope_.directory() + place);
   }
-  for (const std::string& place : failed) writer_.Forget(scope_.directory() + place);
+  if (path == scope_.directory() && failures_.empty()) failures_.ForgetBelow("");  // those beyond the limit, too
   if (!failed.empty()) compared_.clear();
-  Compare(path, {});
+  Compare(path, forced);
   for (const std::string& place : failed) {
     const std::string full_path = scope_.directory() + place;
     if (failures_.Find(place) == nullptr && LookAt(full_path).presence != Entry::kGone) Create(full_path);
@@ -203,6 +225,7 @@ void IndexHandler::ForgetStrangers(const std::string& path) {
   if (!place) return;
   for (const std::string& failed : failures_.AtOrBelow(*place)) {
     const std::string full_path = scope_.directory() + failed;
+    if (scope_.IsPaused(full_path)) continue;
     if (LookAt(full_path).presence == Entry::kGone || !scope_.Covers(full_path)) failures_.Forget(failed);
   }
 }
@@ -213,7 +236,7 @@ void IndexHandler::ForgetStrangers(const std::string& path) {
 void IndexHandler::FollowMoves() {
   for (const std::string& place : former_places_) {
     fileindex::FollowMovedShare(scope_.share(), place);
-    for (const std::string& start : scope_.Starts(scope_.directory())) {
+    for (const std::string& start : scope_.Starts(scope_.directory(), IndexScope::Paused::kToo)) {
       const std::string old = place + start.substr(scope_.directory().size());
       if (LookAt(start).presence == Entry::kThere && elastic::IsDocumentExists(scope_.share(), old)) {
         writer_.Move(start, old, check_point_);
@@ -225,14 +248,30 @@ void IndexHandler::FollowMoves() {
 
 void IndexHandler::FollowFolders() {
   kinds_before_ = FolderKinds::Load(scope_.kinds_file());
+  // Where no pass was committed, the first one may have read some of what is paused.
+  const int64_t since = kinds_before_ ? ChangedSince() : *tried_since_ - kSlowestEvent;
+  kinds_ = scope_.kinds().After(kinds_before_.value_or(FolderKinds()), since);
   if (!kinds_before_ || kinds_ == *kinds_before_) return;
-  for (const auto& [place, kinds] : kinds_.DifferencesFrom(*kinds_before_)) {
+  for (const FolderKinds::Difference& difference : kinds_.DifferencesFrom(*kinds_before_)) {
     if (rebuilt_) return;
-    const std::string path = scope_.directory() + place;
-    const Kinds& forced = kinds;
-    WithIndex([&] { Compare(path, forced); });
+    const std::string path = scope_.directory() + difference.path;
+    if (difference.unseen_since) {
+      recent_ = std::min(recent_, *difference.unseen_since);
+      compared_.clear();
+      WithIndex([&] { Reindex(path, difference.kinds); });
+    } else {
+      WithIndex([&] { Compare(path, difference.kinds); });
+    }
     refreshed_.insert(path);
   }
+}
+
+// What happens in a paused folder is seen to when it is resumed; in folders below it, that are not paused, now. False
+// where the path is in none.
+bool IndexHandler::PassOver(const std::string& path) {
+  if (!scope_.IsPaused(path)) return false;
+  for (const std::string& start : scope_.Starts(path)) Compare(start, {});
+  return true;
 }
 
 Kinds IndexHandler::DifferenceOf(const std::string& path, const std::string& other) const {
@@ -313,7 +352,7 @@ void IndexHandler::Compare(const std::string& path, const Kinds& forced) {
 
 void IndexHandler::CountLooks(const std::string& path) {
   uint64_t count = 0;
-  for (const std::string& start : scope_.Starts(path)) count += CountTree(start, check_point_);
+  for (const std::string& start : scope_.Starts(path)) count += CountTree(scope_, start, check_point_);
   to_look_at_ = count;
 }
 
@@ -380,20 +419,26 @@ void IndexHandler::Rename(const std::string& path, const std::string& path_old) 
   const Entry entry = LookAt(path);
   const Kinds forced = DifferenceOf(path, path_old);
   const bool is_same_kind = GetFileExtension(path, true) == GetFileExtension(path_old, true);
-  const bool can_move = entry.IsDirectory() || (is_same_kind && !forced.Any());
+  // The documents of what is paused may be out of date.
+  const bool has_paused = scope_.HasPaused(path) || scope_.HasPaused(path_old);
+  const bool can_move = !has_paused && (entry.IsDirectory() || (is_same_kind && !forced.Any()));
   const bool moved = entry.presence == Entry::kThere && can_move && scope_.Accepts(path) && Move(path, path_old);
   const Documents at_path = moved ? Documents{.moved_from = path_old, .moved_to = path} : Documents{.of_others = true};
   for (const std::string& end : {path, path_old}) {
-    if (LookAt(end).presence == Entry::kGone) {
-      writer_.DeleteWithAllBelow(end);
-    } else {
-      FindDifferences(end, forced, end == path ? at_path : Documents());
+    for (const std::string& start : scope_.IsPaused(end) ? scope_.Starts(end) : std::vector<std::string>{end}) {
+      if (LookAt(start).presence == Entry::kGone) {
+        writer_.DeleteWithAllBelow(start);
+      } else {
+        FindDifferences(start, forced, end == path ? at_path : Documents());
+      }
     }
   }
 }
 
 void IndexHandler::CarryOut(const fileindex::OP& operation) {
   const std::string path = std::shared_ptr<fileindex::OPNode>(operation.node)->GetPath();
+  const bool is_for_one_path = operation.op != fileindex::kOpRename && operation.op != fileindex::kOpQueueCrashed;
+  if (is_for_one_path && PassOver(path)) return;
   switch (operation.op) {
     case fileindex::kOpDelete:
       return Delete(path);
@@ -428,6 +473,7 @@ void IndexHandler::Commit() {
   failures_.Save();
   if (!kinds_before_ || kinds_ != *kinds_before_) kinds_.Save(scope_.kinds_file());
   committed_kinds_ = kinds_;
+  tried_since_.reset();
   scope_.NoteDisk();
   const timespec times[] = {{0, UTIME_OMIT}, {began_, 0}};
   if (utimensat(AT_FDCWD, scope_.kinds_file().c_str(), times, 0) != 0) {

@@ -9,6 +9,9 @@
 // committed, so that a worker that dies meanwhile begins again. In the same way the folders with which the index was
 // made are written down with it, and what is indexed otherwise since then is done first.
 //
+// While a folder is paused, what happens in it is passed over, and written down with the folders: once it is paused no
+// more, it is compared. A pass that is under way when a folder is paused starts anew.
+//
 // What fails at one path is written down beside the index, when the rest is committed, and keeps nothing else from
 // being done. A pass is also due where something that failed is to be tried again.
 //
@@ -45,7 +48,7 @@ class IndexHandler final : public OperationHandler {
   // Where the share's status asks for a reindex, something is to be tried again, or the folders are others than those
   // that the index was made with.
   bool HasWork() override;
-  std::optional<int64_t> NextWork() const override { return failures_.NextTry(); }
+  std::optional<int64_t> NextWork() const override;
   void Begin(const CheckPoint& check_point) override;
   void Handle(const fileindex::OP& operation) override;
   void Commit() override;
@@ -62,9 +65,12 @@ class IndexHandler final : public OperationHandler {
   bool NeedsReindex() const;
   bool HasOtherFolders();
   void ReadFailures();
+  bool IsPausedPlace(const std::string& place) const { return scope_.IsPaused(scope_.directory() + place); }
   int64_t ChangedSince() const;
+  bool LookAgain();
   void TryAgain();
-  void Reindex(const std::string& path);
+  void Reindex(const std::string& path, const Kinds& forced = {});
+  bool PassOver(const std::string& path);
   void ForgetStrangers(const std::string& path);
   void CountLooks(const std::string& path);
   void CarryOut(const fileindex::OP& operation);
@@ -93,11 +99,14 @@ class IndexHandler final : public OperationHandler {
   std::optional<FolderKinds> committed_kinds_;  // of the last pass that was committed
   std::optional<struct stat> folders_seen_;     // the folder list that the index was made with
 
+  std::optional<int64_t> tried_since_;  // when the first pass after that began, in seconds since the epoch
+
   // Of this pass:
   CheckPoint check_point_;
   struct stat engine_ = {};                  // its socket file
   std::optional<FolderKinds> kinds_before_;  // that the index was made with, where that is known
   FolderKinds kinds_;                        // that it is made with now
+  FolderKinds begun_with_;                   // that the list had
   PathSet compared_;                         // where all that was pending before has been met
   PathSet moved_to_;                         // where documents were moved to
   std::set<std::string> moved_to_below_;     // the same, in order

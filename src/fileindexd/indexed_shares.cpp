@@ -2,6 +2,7 @@
 
 #include "common/error.h"
 #include "fileindex/folder_mgr.h"
+#include "fileindex/folder_pauses.h"
 
 namespace quarrox::fileindexd {
 namespace {
@@ -22,11 +23,13 @@ bool IndexedShares::Refresh() {
   struct stat now = {};
   if (stat(fileindex::kFileIndexFoldersCfgPath, &now) != 0) now = {};
   if (seen_ && IsSameFile(*seen_, now)) return false;
-  std::map<std::string, bool> shares;
+  const fileindex::FolderPauses pauses;
+  std::map<std::string, Share> shares;
   for (const auto& folder : fileindex::FolderMgr().GetFolders()) {
     try {
-      bool& active = shares[folder->GetShare()];
-      active = active || !folder->IsPaused();
+      Share& share = shares[folder->GetShare()];
+      share.is_served = share.is_served || pauses.IsServed(*folder);
+      share.paused += folder->IsPaused() ? 1 : 0;
     } catch (const Error&) {
       // Its path is none. It was logged, and keeps no other folder from being served.
     }

@@ -17,12 +17,17 @@ class IndexedShares {
   // they were.
   bool Refresh();
 
-  // By name; true where at least one of the share's folders is not paused.
-  const std::map<std::string, bool>& shares() const { return shares_; }
+  struct Share {
+    bool is_served = false;  // one of its folders at least is not paused, or only by itself
+    size_t paused = 0;       // folders
+  };
+
+  // By name.
+  const std::map<std::string, Share>& shares() const { return shares_; }
 
  private:
   std::optional<struct stat> seen_;
-  std::map<std::string, bool> shares_;
+  std::map<std::string, Share> shares_;
 };
 
 }  // namespace quarrox::fileindexd

@@ -18,6 +18,10 @@ struct Tally {
   std::string path = {};                        // what is being worked on
 };
 
+// Ends a pass that is to be run again at once, because what it goes by has changed. No Error: nobody on the way is to
+// handle it.
+struct StartAnew {};
+
 // One object serves one share in one process; not thread-safe. A pass begins, hands over each operation of the queue in
 // order of acceptance, and commits. A pass that ends early, for whatever reason, is run again from its beginning, so an
 // operation may come more than once.
@@ -35,7 +39,8 @@ class OperationHandler {
   // When there will be such a pass, in seconds since the epoch; nothing where none is known of.
   virtual std::optional<int64_t> NextWork() const = 0;
 
-  // Each of these throws where the work cannot be done now; the pass is then tried again later.
+  // Each of these throws where the work cannot be done now; the pass is then tried again later, or at once for
+  // StartAnew.
   virtual void Begin(const CheckPoint& check_point) = 0;
   virtual void Handle(const fileindex::OP& operation) = 0;
 

@@ -8,17 +8,18 @@
 #include <vector>
 
 #include "common/file.h"
-#include "fileindex/index_scope.h"
 
 namespace quarrox::fileindexd {
 
-uint64_t CountTree(const std::string& directory, const OperationHandler::CheckPoint& check_point) {
+uint64_t CountTree(const fileindex::IndexScope& scope, const std::string& directory,
+                   const OperationHandler::CheckPoint& check_point) {
   uint64_t count = 0;
   std::vector<std::string> pending = {directory};
   while (!pending.empty()) {
     check_point();
     const std::string path = std::move(pending.back());
     pending.pop_back();
+    if (scope.IsPaused(path)) continue;
     ++count;
     const std::unique_ptr<DIR, int (*)(DIR*)> open_directory(opendir(path.c_str()), closedir);
     if (!open_directory) continue;

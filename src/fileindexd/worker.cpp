@@ -145,7 +145,11 @@ Worker::Outcome Worker::TryDrain() {
     OpenQueue();
     Arm();
     failure_ = "The queue cannot be watched, so it is looked at now and then";
-    if (!Pass()) return armed_ ? Outcome::kDrained : Outcome::kFailed;
+    try {
+      if (!Pass()) return armed_ ? Outcome::kDrained : Outcome::kFailed;
+    } catch (const StartAnew&) {
+      continue;
+    }
     backoff_.Reset();
   }
 }

@@ -87,14 +87,15 @@ class OperationCommandTest(unittest.TestCase):
 
     def test_no_operation_does_anything_for_arguments_that_cannot_be(self):
         good = {"additional": [], "folder_list": [], "path_list": [], "updater_mode": False, "enable": True, "hours": 1, "offset": 0,
-                "limit": 1, "path_from": DOCS, "path_to": DOCS, "share_path": DOCS, "mount_point": machine.SCRATCH, "path": "/docs", "changes": {}}
+                "limit": 1, "resume_time": 0, "path_from": DOCS, "path_to": DOCS, "share_path": DOCS, "mount_point": machine.SCRATCH,
+                "path": "/docs", "changes": {}}
         impossible = ["", "docs\0x", "/docs/a\0b", DOCS + "\0x", "docs/a" * 20000]
         self.assertEqual(machine.ctl("folder", "add", "/docs/a/b")[0], 0)
         self.requests.clear()
         find = ["find", "/var/packages", "/var/lib/vexonotifyd", machine.SCRATCH + "/@fileindex", "-type", "f", "-exec", "sha256sum", "{}", "+"]
         files = subprocess.check_output(find)
         operations = [line.split() for line in refused("call", "FolderEat").splitlines() if line.startswith("  ")]
-        self.assertEqual(len(operations), 31)
+        self.assertEqual(len(operations), 33)
         for name, *names in operations:
             for count in {len(names) + 1, len(names) - 1} - {-1}:
                 self.assertIn("call " + name, refused("call", name, *["1"] * count))

@@ -46,7 +46,7 @@ class SearchTest(unittest.TestCase):
 
     def folders(self, *paths):
         machine.write(ETC / "fileindex.folders", json.dumps([
-            {"path": path, "name": path, "paused": path.endswith("deep"), **KINDS} for path in paths]))
+            {"path": path, "name": path, **KINDS} for path in paths]))
 
     def setUp(self):
         for place in (VOLUME, ETC, machine.SCRATCH + "/engine"):

@@ -86,6 +86,25 @@ class TruthTest(unittest.TestCase):
                 files.step()
             self.expect_truth(files, -seed)
 
+    def test_folders_paused_and_resumed_at_random_moments(self):
+        folders = ["/a", "/a/dir", "/dir", "/dir/g"]
+        os.makedirs(DOCS + "/a/dir"), os.makedirs(DOCS + "/dir/g")
+        self.assertEqual(machine.ctl("folder", "add", *("/docs" + folder for folder in folders))[0], 0)
+        linked = set()
+        for seed in range(SEED, SEED + KILLS):
+            files = Files(DOCS, VOLUME + "/outside", seed, alike=False)
+            files.linked = linked  # also those of the seeds before
+            for _ in range(12):
+                files.step(files.rng.randrange(60))
+                machine.ctl("folder", files.rng.choice(["pause", "pause", "resume"]), "/docs" + files.rng.choice(folders))
+                files.step(files.rng.randrange(20))
+                if files.rng.random() < 0.2:
+                    self.restart("FILEINDEXD")
+                time.sleep(files.rng.random() * 0.4)
+            for folder in folders:
+                self.assertEqual(machine.ctl("folder", "resume", "/docs" + folder)[0], 0)
+            self.expect_truth(files, "pauses %d" % seed)
+
     def test_files_that_change_all_the_time_but_for_a_moment_each_minute(self):
         files = Files(DOCS, VOLUME + "/outside", SEED, alike=False)
         for minute in range(MINUTES):

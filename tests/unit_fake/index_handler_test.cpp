@@ -31,7 +31,7 @@ struct IndexHandlerTest : support::EngineTest {
     fs::create_symlink("a.txt", docs_ + "in/link");
     world_.AddShare({.name = "docs", .path = docs_.substr(0, docs_.size() - 1)});
     FolderMgr folders;
-    std::shared_ptr<Folder> diff, in(new Folder("/docs/in", "n", "", "", true, true, true, false, true, true));
+    std::shared_ptr<Folder> diff, in(new Folder("/docs/in", "n", "", "", true, true, true, false, true, false));
     folders.Upsert(diff, in);
     folders.Save();
   }
@@ -119,7 +119,7 @@ TEST_F(IndexHandlerTest, AFolderListThatChangedIsFollowedWithoutAnyEvent) {
   handler_.Begin(go_on_);
   handler_.Commit();
   FolderMgr folders;
-  std::shared_ptr<Folder> diff, in(new Folder("/docs/in", "n", "", "", true, true, true, true, true, true));
+  std::shared_ptr<Folder> diff, in(new Folder("/docs/in", "n", "", "", true, true, true, true, true, false));
   folders.Upsert(diff, in);
   folders.Save();
   IndexHandler next("docs");
@@ -130,6 +130,55 @@ TEST_F(IndexHandlerTest, AFolderListThatChangedIsFollowedWithoutAnyEvent) {
   next.Commit();
   EXPECT_EQ(Sent(), "commit, get in, get in/, upsert in, upsert in/c.jpg, ");
   EXPECT_FALSE(next.HasWork());
+}
+
+TEST_F(IndexHandlerTest, WhatIsPausedStaysAsItIsAndIsComparedAfterwardsNotTrustingTimesSinceThen) {
+  const auto set = [](const std::string& path, bool photo, bool paused) {
+    FolderMgr folders;
+    std::shared_ptr<Folder> diff, folder(new Folder(path, "n", "", "", true, true, true, photo, true, paused));
+    folders.Upsert(diff, folder);
+    folders.Save();
+  };
+  const std::string all = Hit("in") + Hit("in/a.txt") + Hit("in/b.txt") + Hit("in/c.jpg"), sub = Hit("in/sub");
+  const std::string changed = "upsert in, upsert in/a.txt, upsert in/b.txt, upsert in/c.jpg, ";
+  set("/docs/in/sub", false, false);
+  for (const int64_t later : {0, 3600}) {  // when the files count as changed since they were seen, and when not
+    support::SetTime(time(nullptr) + later);
+    IndexHandler handler("docs");
+    const auto pass = [&](const std::deque<std::string>& answers) {
+      world_.engine_answers = answers;
+      handler.Begin(go_on_);
+      handler.Commit();
+      return Sent();
+    };
+    pass({Found(""), Found("")});
+    set("/docs/in", false, true);
+    EXPECT_TRUE(handler.HasWork());
+    EXPECT_EQ(pass({}), "commit, ");
+    set("/docs/in", true, true);  // which is for afterwards
+    EXPECT_FALSE(handler.HasWork());
+    handler.Begin(go_on_);
+    const auto handle = [&](FileIndexOP op, const std::string& name, const std::deque<std::string>& answers) {
+      world_.engine_answers = answers;
+      handler.Handle({tree_.GetNodeByPath(docs_ + name), op, docs_ + "in/old", {}});
+      return Sent();
+    };
+    for (const auto op : {kOpCreate, kOpDelete, kOpAttr, kOpRename}) EXPECT_EQ(handle(op, "in/gone", {}), "");
+    EXPECT_EQ(handle(kOpQueueCrashed, "", {Found(all + Hit("in/x") + Hit("in/sub/x"))}),
+              "del in/sub/x, get /, upsert in/sub, ");
+    handler.Begin(go_on_);
+    EXPECT_EQ(handle(kOpReindex, "in", {Found(""), Found("")}), "get in/sub, get in/sub/, upsert in/sub, ");
+    set("/docs/in", true, false);
+    support::SetTime(time(nullptr) + 100);
+    EXPECT_TRUE(IndexHandler("docs").HasWork());
+    EXPECT_EQ(pass({Found(""), Found(all + sub)}),
+              "commit, get in, get in/, " + (later == 0 ? changed : "upsert in/c.jpg, "));
+    EXPECT_FALSE(handler.HasWork());
+    handler.Begin([&] { return set("/docs/in", false, true), true; });
+    world_.engine_answers = {Found("")};
+    EXPECT_THROW(handler.Handle({tree_.GetNodeByPath(docs_), kOpQueueCrashed, "", {}}), StartAnew);
+    set("/docs/in", false, false);
+  }
 }
 
 TEST_F(IndexHandlerTest, AShareWhoseDiskGoesAwayKeepsItsIndexAndASignalEndsAWalk) {

@@ -1,3 +1,4 @@
+#include "fileindex/folder_pauses.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/optree.h"
 #include "support/index_mgr_test.h"
@@ -35,6 +36,50 @@ TEST_F(IndexMgrShareTest, APausedShareComesBackWithItsMonitorAndAnOperationStops
   EXPECT_EQ(toString(world_.monitors[QueuePath("docs")]["config"][1]) +
                 toString(world_.monitors[QueuePath("docs")]["config"][2]),
             R"({"ignore":["@eaDir"],"mask":65484,"path":"/tmp/v/docs/b"}null)");
+}
+
+TEST_F(IndexMgrShareTest, AFolderIsPausedByItselfUntilItIsResumedOrItsTimeOrItsShareSaysOtherwise) {
+  const auto end_of = [](const std::string& path) {
+    std::shared_ptr<Folder> folder;
+    FolderMgr().Get(folder, path);
+    return FolderPauses().EndOf(*folder).value_or(-1);
+  };
+  EXPECT_EQ(ReasonOf(902, [] { FolderPause("/docs/c", 0); }), "/docs/c");
+  EXPECT_EQ(ReasonOf(120, [] { FolderPause("/docs/a", -1); }), "Pause length should NOT be negative");
+  support::SetTime(1000);
+  FolderPause("/docs/a", 0);
+  for (const int end : {2000, 1001}) FolderPause("/docs/b", end);
+  EXPECT_EQ(Told(), "notify_setting_changed docs; notify_setting_changed docs; notify_setting_changed docs; ");
+  EndFolderPauses("docs");
+  EXPECT_EQ(Folders() + Taken("docs"), "/docs/a- /docsx/ /homes/al /docs/b- /music/ ");
+  support::SetTime(1001);
+  EndFolderPauses("docsx");
+  EXPECT_EQ(end_of("/docs/b"), 1001);
+  EndFolderPauses("docs");
+  EXPECT_EQ(Folders(), "/docs/a- /docsx/ /homes/al /docs/b /music/ ");
+  const Event event(Taken("docs"));
+  EXPECT_EQ(event.path, "/tmp/v/docs/b");
+
+  world_.AddShare({.name = "new", .path = "/tmp/v/new"});
+  std::filesystem::create_directories("/tmp/v/@fileindex/new");
+  FolderPause("/docs/b", 3000);
+  ShareRename("docs", "new");
+  EXPECT_EQ(std::pair(end_of("/new/a"), end_of("/new/b")), std::pair(int64_t{0}, int64_t{3000}));
+  Json::Value record, changes;
+  changes["paused"] = false;
+  std::filesystem::create_directories("/tmp/v/new/b");
+  FolderChange(record, "/new/b", changes);
+  changes["paused"] = true;
+  FolderChange(record, "/new/b", changes);
+  EXPECT_EQ(end_of("/new/b"), -1);  // it is paused, but not until then
+  FolderResume("/new/b");
+  SharePause("new");
+  const std::string reason = ReasonOf(120, [] { FolderPause("/new/a", 0); });
+  EXPECT_THAT(reason, HasSubstr("fileindexctl share resume new"));
+  EXPECT_EQ(ReasonOf(120, [] { FolderResume("/new/a"); }), reason);
+  ShareResume("new");
+  EXPECT_EQ(Folders(), "/new/a /docsx/ /homes/al /music/ /new/b ");
+  EXPECT_TRUE(FolderPauses().empty());
 }
 
 TEST_F(IndexMgrShareTest, ARenamedShareKeepsItsFoldersEvenWhereTheEngineFails) {
