@@ -50,28 +50,43 @@ bool Findings::AddText(std::string_view text) {
 
 void Findings::Set(const char* field, std::string_view text) {
   if (Has(field)) return;
-  std::string clean = Cleaned(text);
-  if (!clean.empty()) fields_[field] = std::move(clean);
+  const std::string clean = Cleaned(text);
+  if (!clean.empty()) fields_[field] = clean;
 }
 
 void Findings::Set(const char* field, int64_t number) {
   if (!Has(field)) fields_[field] = Json::Int64{number};
 }
 
+void Findings::Set(const char* field, bool yes) {
+  if (!Has(field)) fields_[field] = yes;
+}
+
 void Findings::Set(const char* field, double number) {
   if (!Has(field) && std::isfinite(number)) fields_[field] = number;
 }
 
+// The separator has blanks around it, because some fields are analyzed by blanks alone.
 void Findings::Add(const char* field, std::string_view text) {
   if (!Has(field)) return Set(field, text);
+  constexpr std::string_view kSeparator = " ; ";
+  const char* begin = nullptr;
+  const char* end = nullptr;
+  fields_[field].getString(&begin, &end);
+  const std::string_view all(begin, static_cast<size_t>(end - begin));
   const std::string clean = Cleaned(text);
-  std::string all = fields_[field].asString();
-  if (clean.empty() || ("; " + all + "; ").find("; " + clean + "; ") != std::string::npos) return;
-  if (all.size() + clean.size() + 2 <= kLongestField) fields_[field] = all.append("; ").append(clean);
+  if (clean.empty() || all.size() + clean.size() + kSeparator.size() > kLongestField) return;
+  for (std::string_view rest = all;;) {
+    const size_t next = rest.find(kSeparator);
+    if (rest.substr(0, next) == clean) return;
+    if (next == std::string_view::npos) break;
+    rest.remove_prefix(next + kSeparator.size());
+  }
+  fields_[field] = std::string(all).append(kSeparator).append(clean);
 }
 
 Json::Value Findings::Take() {
-  if (text_.find_first_not_of(" \n\t") != std::string::npos) fields_["VEXOMDTextContent"] = std::move(text_);
+  if (text_.find_first_not_of(" \n\t") != std::string::npos) fields_["VEXOMDTextContent"] = text_;
   text_.clear();
   return std::exchange(fields_, Json::Value(Json::objectValue));
 }

@@ -30,9 +30,10 @@ class Findings {
   void Set(const char* field, const char* text) { Set(field, std::string_view(text)); }
   void Set(const char* field, int64_t number);
   void Set(const char* field, int number) { Set(field, int64_t{number}); }
+  void Set(const char* field, bool yes);
   void Set(const char* field, double number);  // nothing where it is not finite
 
-  // One more value of a field with several, such as the authors: "one; other". One that is there is left out.
+  // One more value of a field with several, such as the authors: "one ; other". One that is there is left out.
   void Add(const char* field, std::string_view text);
 
   bool Has(const char* field) const { return fields_.isMember(field); }
