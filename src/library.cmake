@@ -17,7 +17,7 @@ if(NOT FILEINDEX_SANITIZE)
   # A sanitizer's own calls are resolved only in the program.
   target_link_options(fileindex PRIVATE -Wl,--no-undefined)
 endif()
-add_dependencies(fileindex common fileindex_core)
+add_dependencies(fileindex common fileindex_core vexocontentextract)
 
 # What a user of the library includes: the public headers name jsoncpp and Boost, both found by name.
 install(TARGETS fileindex EXPORT fileindexTargets LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR})

@@ -15,12 +15,22 @@ bool IsControl(UChar32 c) {
   return (c < 0x20 && c != '\n' && c != '\t') || c == 0x7f;
 }
 
+// What goes as it is, and stands for itself: most of all texts.
+bool IsPlain(uint8_t byte) {
+  return (byte >= 0x20 && byte < 0x7f) || byte == '\n' || byte == '\t';
+}
+
 // Appends a text as UTF-8 without control characters, up to a length, cut between characters.
 void AppendClean(std::string_view text, size_t longest, std::string* out) {
   const auto* const bytes = reinterpret_cast<const uint8_t*>(text.data());
   const auto size = static_cast<int32_t>(std::min(text.size(), longest + U8_MAX_LENGTH));
   for (int32_t at = 0; at < size;) {
     const int32_t start = at;
+    while (at < size && IsPlain(bytes[at])) ++at;
+    const auto room = static_cast<int32_t>(longest - std::min(longest, out->size()));
+    out->append(text.substr(static_cast<size_t>(start), static_cast<size_t>(std::min(at - start, room))));
+    if (at - start > room) return;
+    if (at > start) continue;
     UChar32 c = 0;
     U8_NEXT(bytes, at, size, c);
     const std::string_view character = c < 0 ? kReplacement

@@ -1,46 +1,40 @@
-// Reads what is in one file.
+// Reads what is in files: one that a person names, or those that another process hands over.
 #include <fcntl.h>
-#include <magic.h>
 #include <sys/stat.h>
 
 #include <cerrno>
+#include <clocale>
 #include <cstdio>
 #include <cstring>
 #include <exception>
-#include <stdexcept>
 #include <string>
 #include <system_error>
 
 #include "common/json.h"
 #include "common/strings.h"
 #include "common/unique_fd.h"
-#include "extract/formats.h"
+#include "extract/file_type.h"
+#include "extract/sandbox.h"
+#include "extract/server.h"
 
 namespace {
 
 using namespace platform::extract;
 
-std::string TypeOf(int fd) {
-  const magic_t cookie = magic_open(MAGIC_MIME_TYPE);
-  if (cookie == nullptr || magic_load(cookie, nullptr) != 0) throw std::runtime_error("no table of file types");
-  const char* const type = magic_descriptor(cookie, fd);
-  const std::string result = type == nullptr ? "application/octet-stream" : type;
-  magic_close(cookie);
-  return result;
-}
-
 int Print(const std::string& path) {
   const quarrox::UniqueFd fd(open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
   struct stat info;
   if (!fd || fstat(fd.get(), &info) != 0) throw std::system_error(errno, std::generic_category(), path);
-  const Source source{fd.get(), static_cast<uint64_t>(info.st_size), TypeOf(fd.get()),
-                      quarrox::GetFileExtension(path, true)};
+  const FileTypes types;
+  EnterSandbox();
+  Source source{fd.get(), static_cast<uint64_t>(info.st_size), {}, quarrox::GetFileExtension(path, true)};
+  source.type = types.Of(source);
+  printf("type: %s%s\n", source.type.c_str(),
+         FindExtractor(source.type) == nullptr ? " (no format that is parsed)" : "");
   Findings findings;
-  const Extractor extract = FindExtractor(source.type);
-  printf("type: %s%s\n", source.type.c_str(), extract == nullptr ? " (not read)" : "");
   int status = 0;
   try {
-    if (extract != nullptr) extract(source, findings);
+    ReaderOf(source.type)(source, findings);
   } catch (const std::exception& error) {
     printf("damaged: %s\n", error.what());
     status = 1;
@@ -49,15 +43,28 @@ int Print(const std::string& path) {
   return status;
 }
 
+// Standard input is the socket.
+int Work() {
+  const FileTypes types;
+  const int parent = OpenParent();
+  const Json::Value features = EnterSandbox();
+  EndWith(parent);
+  Serve(STDIN_FILENO, features, {[&](const Source& source) { return types.Of(source); }, ReaderOf});
+  return 0;
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
   if (argc != 2) {
-    fputs("usage: vexocontentextract FILE\n", stderr);
+    fputs("usage: vexocontentextract FILE\n       vexocontentextract --worker\n", stderr);
     return 2;
   }
+  setlocale(LC_CTYPE, "C.UTF-8");  // names in archives may be any Unicode
   try {
-    return Print(argv[1]);
+    const int status = strcmp(argv[1], "--worker") == 0 ? Work() : Print(argv[1]);
+    fflush(stdout);
+    _exit(status);  // what threads of libraries do at the end is of no use
   } catch (const std::exception& error) {
     fprintf(stderr, "vexocontentextract: %s\n", error.what());
     return 1;

@@ -2,16 +2,20 @@
 
 #include <fcntl.h>
 #include <sys/stat.h>
+#include <sys/xattr.h>
 
 #include <cerrno>
 #include <cstdio>
 #include <optional>
 #include <stdexcept>
+#include <string>
+#include <string_view>
 #include <system_error>
-#include <utility>
 
 #include "common/strings.h"
+#include "common/unique_fd.h"
 #include "linux/content_extract_text.h"
+#include "linux/content_workers.h"
 
 namespace {
 
@@ -20,12 +24,12 @@ constexpr unsigned int kBlockSize = 512;
 
 struct statx Look(const std::string& path) {
   if (path.empty() || path.front() != '/' || path.find('\0') != std::string::npos) {
-    throw std::invalid_argument("not an absolute path: " + path);
+    throw std::invalid_argument("it has no absolute path");
   }
   struct statx info;
   constexpr unsigned int kWanted = STATX_BASIC_STATS | STATX_BTIME;
   if (statx(AT_FDCWD, path.c_str(), AT_SYMLINK_NOFOLLOW | AT_NO_AUTOMOUNT, kWanted, &info) != 0) {
-    throw std::system_error(errno, std::generic_category(), path);
+    throw std::system_error(errno, std::generic_category());
   }
   return info;
 }
@@ -72,20 +76,81 @@ bool NeedsContent(const Json::Value& options) {
   return needed.isBool() && needed.asBool();
 }
 
+// Reading for the index is no use of the file, so its access time stays; only the owner and root may ask for that.
+int OpenUnnoticed(const std::string& path) {
+  constexpr int kFlags = O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC;
+  const int fd = open(path.c_str(), kFlags | O_NOATIME);
+  return fd < 0 && errno == EPERM ? open(path.c_str(), kFlags) : fd;
+}
+
+// What cannot be opened as it is, whoever tries again: not readable, a symbolic link, a socket, a device that is not
+// there.
+bool HasNoContent(int error) {
+  return error == EACCES || error == EPERM || error == ELOOP || error == ENXIO || error == ENODEV;
+}
+
+// Whether there may be tags or comments of people in the file's extended attributes; reading them takes some parsing.
+bool HasNotes(int fd) {
+  constexpr std::string_view kOfUsers("\0user.", 6);
+  char names[4096] = "";  // each ends with a zero byte
+  const ssize_t size = flistxattr(fd, names + 1, sizeof(names) - 1);
+  if (size < 0) return errno == ERANGE;
+  return std::string_view(names, static_cast<size_t>(size) + 1).find(kOfUsers) != std::string_view::npos;
+}
+
+// Adds what is in a file. By now the path may name anything.
+void ReadContents(const std::string& path, Json::Value& fields) {
+  const quarrox::UniqueFd fd(OpenUnnoticed(path));
+  if (!fd && HasNoContent(errno)) return;
+  struct stat info;
+  if (!fd || fstat(fd.get(), &info) != 0) throw std::system_error(errno, std::generic_category());
+  if (!S_ISREG(info.st_mode)) return;
+  const std::string extension = fields["VEXOMDExtension"].asString();
+  const auto size = static_cast<uint64_t>(info.st_size);
+  const std::optional<std::string> text =
+      !HasNotes(fd.get()) ? platform::ReadPlainText(fd.get(), size, extension) : std::optional<std::string>();
+  if (text) {
+    fields["VEXOMDTextContent"] = *text;
+  } else {
+    platform::ContentWorkers::OfProcess().Read({fd.get(), size, extension}, fields);
+  }
+}
+
+thread_local std::string last_failure;
+
 }  // namespace
 
 namespace VEXO::CONTENT_EXTRACT {
 
 void ParseFile(const std::string& path, const Json::Value& options, Json::Value& document) {
-  const struct statx info = Look(path);
-  Json::Value fields(Json::objectValue);
-  SetNames(path, fields);
-  SetAttributes(info, fields);
-  if (S_ISREG(info.stx_mode) && NeedsContent(options)) {
-    std::optional<std::string> text = platform::ReadPlainText(path);
-    if (text) fields["VEXOMDTextContent"] = *text;
+  last_failure.clear();
+  try {
+    const struct statx info = Look(path);
+    Json::Value fields(Json::objectValue);
+    SetNames(path, fields);
+    SetAttributes(info, fields);
+    if (S_ISREG(info.stx_mode) && NeedsContent(options)) ReadContents(path, fields);
+    for (auto field = fields.begin(); field != fields.end(); ++field) document[field.name()].swap(*field);
+  } catch (const std::exception& error) {
+    last_failure = error.what();
+    throw;
   }
-  for (auto field = fields.begin(); field != fields.end(); ++field) document[field.name()].swap(*field);
+}
+
+std::string LastFailure() {
+  return last_failure;
+}
+
+Json::Value ReaderFeatures() {
+  const std::string program = platform::ContentProgram();
+  Json::Value features(Json::objectValue);
+  try {
+    features = platform::ContentWorker(program).features();
+  } catch (const std::system_error& error) {
+    features["failure"] = error.what();
+  }
+  features["program"] = program;
+  return features;
 }
 
 }  // namespace VEXO::CONTENT_EXTRACT

@@ -1,7 +1,5 @@
 #include "linux/content_extract_text.h"
 
-#include <fcntl.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -11,10 +9,7 @@
 
 #include <unicode/utf8.h>
 
-#include "common/unique_fd.h"
 #include "linux/utf8.h"
-
-using quarrox::UniqueFd;
 
 namespace platform {
 namespace {
@@ -24,35 +19,41 @@ constexpr std::string_view kByteOrderMark = "\xef\xbb\xbf";
 // One byte past the longest text tells that there is more.
 constexpr size_t kLongestRead = kByteOrderMark.size() + kLongestText + 1;
 
-[[noreturn]] void Throw(const std::string& path) {
-  throw std::system_error(errno, std::generic_category(), path);
+// Begins the multi-byte characters of seven-bit encodings, which else look like ASCII.
+constexpr std::string_view kEscape = "\x1b$";
+
+// Most files are shorter; what a file begins with tells whether it is text. In bytes.
+constexpr size_t kFirstRead = size_t{64} << 10;
+
+// Finds out that it was the end; in bytes.
+constexpr size_t kLastRead = 4096;
+
+// Formats that are text and are parsed: by their extensions, and by their first bytes.
+constexpr std::string_view kParsedExtensions[] = {
+    "htm",  "html", "xhtml", "xht", "shtml", "xml", "svg",  "rss", "atom",  "fodt", "fods",
+    "fodp", "fodg", "opf",   "rdf", "rtf",   "eml", "mbox", "mht", "mhtml", "pdf",  "mobileconfig"};
+constexpr std::string_view kParsedBeginnings[] = {"<",         "%PDF",         "{\\rtf",       "From ",
+                                                  "Received:", "Return-Path:", "Delivered-To:"};
+
+bool IsParsed(const std::string& extension) {
+  return std::find(std::begin(kParsedExtensions), std::end(kParsedExtensions), extension) !=
+         std::end(kParsedExtensions);
 }
 
-// Reading for the index is no use of the file, so its access time stays; only the owner and root may ask for that.
-int OpenUnnoticed(const std::string& path) {
-  constexpr int kFlags = O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC;
-  const int fd = open(path.c_str(), kFlags | O_NOATIME);
-  return fd < 0 && errno == EPERM ? open(path.c_str(), kFlags) : fd;
-}
-
-// What cannot be opened as it is, whoever tries again: not readable, a symbolic link, a socket, a device that is not
-// there.
-bool HasNoContent(int error) {
-  return error == EACCES || error == EPERM || error == ELOOP || error == ENXIO || error == ENODEV;
-}
-
-// Reads up to kLongestRead bytes; false at the first zero byte.
-bool ReadWithoutZeros(int fd, const std::string& path, std::string* text) {
-  char buffer[65536];
-  while (text->size() < kLongestRead) {
-    const size_t wanted = std::min(sizeof(buffer), kLongestRead - text->size());
-    const ssize_t n = read(fd, buffer, wanted);
+// Reads up to kLongestRead bytes; false at the first zero byte. `size` is how many there seem to be.
+bool ReadWithoutZeros(int fd, size_t size, std::string* text) {
+  size_t done = 0;
+  for (size_t more = std::min(size + 1, kFirstRead); done < kLongestRead;) {
+    const size_t wanted = std::min(more, kLongestRead - done);
+    text->resize(done + wanted);
+    const ssize_t n = read(fd, text->data() + done, wanted);
     if (n < 0 && errno == EINTR) continue;
-    if (n < 0) Throw(path);
+    if (n < 0) throw std::system_error(errno, std::generic_category());
+    text->resize(done + static_cast<size_t>(n));
     if (n == 0) return true;
-    const std::string_view part(buffer, static_cast<size_t>(n));
-    if (part.find('\0') != std::string_view::npos) return false;
-    text->append(part);
+    if (text->find('\0', done) != std::string::npos) return false;
+    done = text->size();
+    more = static_cast<size_t>(n) < wanted ? kLastRead : done;
   }
   return true;
 }
@@ -66,20 +67,19 @@ void Cut(std::string* text) {
 
 }  // namespace
 
-std::optional<std::string> ReadPlainText(const std::string& path) {
-  const UniqueFd fd(OpenUnnoticed(path));
-  if (!fd) {
-    if (HasNoContent(errno)) return std::nullopt;
-    Throw(path);
-  }
-  struct stat info;
-  if (fstat(fd.get(), &info) != 0) Throw(path);
-  if (!S_ISREG(info.st_mode)) return std::nullopt;
+bool BeginsParsed(std::string_view text) {
+  text.remove_prefix(std::min(text.find_first_not_of(" \t\r\n"), text.size()));
+  return std::any_of(std::begin(kParsedBeginnings), std::end(kParsedBeginnings),
+                     [&](std::string_view beginning) { return text.starts_with(beginning); });
+}
+
+std::optional<std::string> ReadPlainText(int fd, size_t size, const std::string& extension) {
   std::string text;
-  if (!ReadWithoutZeros(fd.get(), path, &text)) return std::nullopt;
+  if (IsParsed(extension) || !ReadWithoutZeros(fd, size, &text)) return std::nullopt;
   if (text.compare(0, kByteOrderMark.size(), kByteOrderMark) == 0) text.erase(0, kByteOrderMark.size());
   Cut(&text);
-  if (!IsUtf8(text)) return std::nullopt;
+  const bool is_escaped = text.find(kEscape) != std::string::npos;
+  if (is_escaped || BeginsParsed(text) || !IsUtf8(text)) return std::nullopt;
   return text;
 }
 

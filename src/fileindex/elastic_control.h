@@ -31,6 +31,12 @@ QUARROX_API bool IsDocumentExists(const std::string& share, const std::string& p
 // the file cannot be looked at or read; errno is then what the system says about it, 0 where that is not the reason.
 QUARROX_API void IndexUpsert(const std::string& share, const std::string& path, bool need_meta);
 
+// Why the last file of this thread could not be read, in words; empty where it could.
+QUARROX_API std::string LastReadFailure();
+
+// What reads the contents of files, as vexo/content_extract.h says.
+QUARROX_API Json::Value ReaderFeatures();
+
 // Refreshes what the file system says of a file. Throws Error 917 where it has no document, 914 as IndexUpsert.
 QUARROX_API void IndexAttr(const std::string& share, const std::string& path);
 

@@ -143,6 +143,14 @@ void MoveAll(const std::string& index_id, const Json::Value& hits, const std::st
 
 }  // namespace
 
+std::string LastReadFailure() {
+  return VEXO::CONTENT_EXTRACT::LastFailure();
+}
+
+Json::Value ReaderFeatures() {
+  return VEXO::CONTENT_EXTRACT::ReaderFeatures();
+}
+
 bool IsDocumentExists(const std::string& share, const std::string& path) {
   return !GetByQuery(__func__, PathQuery(GetFileIndexID(share), "term", path)).empty();
 }

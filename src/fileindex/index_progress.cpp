@@ -47,6 +47,10 @@ std::optional<IndexProgress> IndexProgress::Load(const std::string& file) {
   Take(progress.done, data, "done");
   Take(progress.failed, data, "failed");
   if (data["left"].isUInt64()) progress.left = data["left"].asUInt64();
+  const Json::Value& operations = data["operations"];
+  for (Json::ArrayIndex i = 0; operations.isArray() && i < progress.operations.size(); ++i) {
+    if (operations[i].isUInt64()) progress.operations[i] = operations[i].asUInt64();
+  }
   progress.path = TextOf(data["path"]);
   progress.reason = TextOf(data["reason"]);
   return progress;
@@ -62,6 +66,7 @@ bool IndexProgress::Save(const std::string& file) const {
   data["done"] = Json::UInt64{done};
   data["failed"] = Json::UInt64{failed};
   if (left) data["left"] = Json::UInt64{*left};
+  for (const uint64_t count : operations) data["operations"].append(Json::UInt64{count});
   data["path"] = path;
   data["reason"] = reason;
   const std::string text = toString(data) + '\n';

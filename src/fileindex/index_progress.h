@@ -1,6 +1,7 @@
 // How far the indexing of a share is, as its worker tells people. One small file beside the share's database.
 #pragma once
 
+#include <array>
 #include <cstdint>
 #include <optional>
 #include <string>
@@ -28,6 +29,10 @@ struct QUARROX_API IndexProgress {
   uint64_t done = 0;
   uint64_t failed = 0;
   std::optional<uint64_t> left;
+
+  // Operations that were carried out since the file was first made, each at the number of its FileIndexOP; those of a
+  // pass that is made again count again.
+  std::array<uint64_t, 8> operations = {};
 
   std::string path;    // what is being worked on
   std::string reason;  // why it waits

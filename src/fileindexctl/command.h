@@ -89,6 +89,7 @@ int ShareRebuild(const Arguments& arguments);
 int ShareRename(const Arguments& arguments);
 int ShareResume(const Arguments& arguments);
 int ShareShow(const Arguments& arguments);
+int Metrics(const Arguments& arguments);
 int Status(const Arguments& arguments);
 int SuggestRebuild(const Arguments& arguments);
 int ExplainPath(const Arguments& arguments);

@@ -22,14 +22,23 @@ struct Row {
 
 // In the order in which remedies are to be followed: what a remedy takes for granted stands before it.
 constexpr Row kChecks[] = {
-    {"caller", CheckCaller},   {"versions", CheckVersions},
-    {"daemons", CheckDaemons}, {"sockets", CheckSockets},
-    {"rights", CheckRights},   {"locks", CheckLocks},
-    {"inotify", CheckInotify}, {"fanotify", CheckFanotify},
-    {"room", CheckRoom},       {"shares.conf", CheckConfiguration},
-    {"shares", CheckShares},   {"folders", CheckFolders},
-    {"index", CheckIndexes},   {"monitor", CheckMonitors},
-    {"flags", CheckFlags},     {"leftovers", CheckLeftovers},
+    {"caller", CheckCaller},
+    {"versions", CheckVersions},
+    {"daemons", CheckDaemons},
+    {"sockets", CheckSockets},
+    {"rights", CheckRights},
+    {"locks", CheckLocks},
+    {"inotify", CheckInotify},
+    {"fanotify", CheckFanotify},
+    {"contents", CheckContents},
+    {"room", CheckRoom},
+    {"shares.conf", CheckConfiguration},
+    {"shares", CheckShares},
+    {"folders", CheckFolders},
+    {"index", CheckIndexes},
+    {"monitor", CheckMonitors},
+    {"flags", CheckFlags},
+    {"leftovers", CheckLeftovers},
 };
 
 // What keeps a check from its end may keep others from theirs: that is said once.

@@ -115,6 +115,7 @@ Check CheckRights;
 Check CheckLocks;
 Check CheckInotify;
 Check CheckFanotify;
+Check CheckContents;  // of files can be read, and safely
 Check CheckRoom;
 Check CheckConfiguration;  // of the shares
 Check CheckShares;         // that folders lie in

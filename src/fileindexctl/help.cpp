@@ -28,6 +28,7 @@ const std::pair<const char*, const char*> kOptionTexts[] = {
     {"--share=", "only in this share"},
     {"--sort=", "what they are sorted by; path without it"},
     {"--summary", "print only the counts"},
+    {"--textfile=", "write a file, as a whole, instead"},
     {"--type=", "only files with one of these extensions, with commas between them"},
     {"--types=", "the kinds of files that are indexed, with commas between them"},
     {"--until-idle", "follow only until nothing is left to be done; status 1 where a share waits for over a minute"},

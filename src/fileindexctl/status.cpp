@@ -187,6 +187,7 @@ IndexingStatus LookAtIndexing(bool with_folders) {
     if (folder->IsPaused()) ++paused[folder->GetShare()];
   }
   IndexingStatus status;
+  status.daemon_runs = machine.daemon_runs;
   sdk::OpenShares shares;
   for (const std::string& name : folders.GetIndexedShares()) {
     ShareStatus& share = status.shares.emplace_back(ShareStatus{.name = name});

@@ -49,6 +49,7 @@ struct ShareStatus {
 
 struct IndexingStatus {
   std::vector<ShareStatus> shares = {};    // in which folders are indexed, by name
+  bool daemon_runs = false;                // fileindexd
   std::vector<std::string> problems = {};  // that concern all of them, for people
 };
 
@@ -57,6 +58,9 @@ bool IsWorker(int64_t pid);
 
 // Looks at the machine, with one exchange with the engine. `with_folders` reads the queues, too.
 IndexingStatus LookAtIndexing(bool with_folders);
+
+// A state in one word, for programs.
+std::string NameOf(ShareStatus::State state);
 
 // Everything as JSON on one line; what it does in words, without its name; the same with the number of its documents
 // or, while it is worked on, with a bar where `bar` is set.

@@ -108,10 +108,14 @@ std::string DescribeLong(const ShareStatus& share, bool bar) {
   return (share.documents ? Documents(*share.documents) + ", " : "") + Describe(share);
 }
 
+std::string NameOf(State state) {
+  return kStates[static_cast<size_t>(state)];
+}
+
 std::string AsJson(const ShareStatus& share) {
   Json::Value object;
   object["share"] = share.name;
-  object["state"] = kStates[static_cast<size_t>(share.state)];
+  object["state"] = NameOf(share.state);
   object["reason"] = share.reason;
   object["documents"] = OrNull(share.documents);
   object["done"] = Json::UInt64{share.progress.done};

@@ -26,9 +26,9 @@ bool ConcernsOnePath(int code) {
 }
 
 // Errors that go away without a change of the file: of the disk, of rights further up, of the machine's resources, of
-// another machine that lends the disk.
+// another machine that lends the disk. What is not there while the file is, is a program that reads it.
 bool MaySucceedLater(int error) {
-  constexpr int kPassing[] = {EIO,    EACCES, EPERM,  ENOMEM, EAGAIN,    EBUSY,    EINTR,        EMFILE,
+  constexpr int kPassing[] = {EIO,    ENOENT, EACCES, EPERM,  ENOMEM,    EAGAIN,   EBUSY,        EINTR,     EMFILE,
                               ENFILE, ENOSPC, EDQUOT, ESTALE, ETIMEDOUT, ENOTCONN, EHOSTUNREACH, ECONNRESET};
   return std::find(std::begin(kPassing), std::end(kPassing), error) != std::end(kPassing);
 }
@@ -61,7 +61,8 @@ std::optional<IndexWriter::Failure> IndexWriter::Try(const std::function<void()>
     Failure failure;
     failure.code = error.code;
     failure.reason = error.reason;
-    if (system_error != 0) failure.reason.append(", reason=").append(strerror(system_error));
+    const std::string why = error.code == kErrEngineParse ? elastic::LastReadFailure() : "";
+    if (!why.empty()) failure.reason.append(", reason=").append(why);
     failure.may_succeed_later = MaySucceedLater(system_error);
     return failure;
   }

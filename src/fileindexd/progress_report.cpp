@@ -17,7 +17,9 @@ void ProgressReport::Open(const std::string& file) {
   file_ = file;
   told_ = false;
   const std::optional<Progress> before = Progress::Load(file);
-  if (before && before->committed > progress_.committed) progress_.committed = before->committed;
+  if (!before) return;
+  if (before->committed > progress_.committed) progress_.committed = before->committed;
+  progress_.operations = before->operations;
 }
 
 void ProgressReport::Save() {
@@ -47,6 +49,11 @@ void ProgressReport::Become(Progress::State state, const std::string& reason, co
 
 void ProgressReport::Work() {
   Become(Progress::State::kWorking, "", {});
+}
+
+void ProgressReport::Count(fileindex::FileIndexOP operation) {
+  if (const auto kind = static_cast<size_t>(operation); kind < progress_.operations.size())
+    ++progress_.operations[kind];
 }
 
 void ProgressReport::Committed() {

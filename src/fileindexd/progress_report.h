@@ -7,6 +7,7 @@
 #include <string>
 
 #include "fileindex/index_progress.h"
+#include "fileindex/optree.h"
 #include "operation_handler.h"
 #include "wait.h"
 
@@ -19,6 +20,7 @@ class ProgressReport {
   void Open(const std::string& file);
 
   void Work();
+  void Count(fileindex::FileIndexOP operation);
   void Committed();
   void Idle(const Tally& tally);
   void Wait(const std::string& reason, const Tally& tally);

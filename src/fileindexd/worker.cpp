@@ -116,6 +116,7 @@ void Worker::HandleQueue(const QueueMgr& queue) {
   operations_ = operations->Count();
   operations->ProcessOP([this](const std::shared_ptr<fileindex::OP>& operation) {
     --*operations_;
+    progress_.Count(operation->op);
     handler_.Handle(*operation);
   });
 }

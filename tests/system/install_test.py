@@ -76,6 +76,9 @@ class InstallTest(unittest.TestCase):
         self.assertEqual([name for name in names if "(anonymous" in name or "quarrox::log::" in name], [])
         self.assertRegex(run("readelf", "-d", self.library), r"SONAME.*\[libfileindex\.so\.\d+\]")
 
+    def test_what_reads_files_lies_where_the_library_looks_for_it(self):
+        self.assertTrue(os.access(os.path.dirname(self.library) + "/fileindex/vexocontentextract", os.X_OK))
+
 
 if __name__ == "__main__":
     unittest.main()

@@ -12,6 +12,8 @@ import unittest
 
 import private_machine as machine
 
+CTL = os.environ["FILEINDEXCTL"]
+
 ETC, VOLUME = pathlib.Path("/var/packages/Quarrox/etc"), pathlib.Path(machine.SCRATCH, "v")
 
 
@@ -97,6 +99,16 @@ class StatusTest(unittest.TestCase):
         self.assertEqual(self.follow("--until-idle").wait(60), 0)
         self.assertEqual([share["state"] for share in status().values()], ["current", "current"])
         self.assertEqual([share["documents"] for share in status().values()], [1, 3031])
+        figures = dict(line.rsplit(" ", 1) for line in subprocess.check_output([CTL, "metrics"], text=True).splitlines() if not line.startswith("#"))
+        for name, value in [("documents{share=\"photos\"}", 3031), ("share_state{share=\"docs\",state=\"current\"}", 1),
+                            ("failures{share=\"docs\",reason=\"not_readable\"}", 0), ("up{daemon=\"vexoelasticd\"}", 1),
+                            ("queue_bytes{share=\"docs\"}", 0)]:
+            self.assertEqual(float(figures["fileindex_" + name]), value, name)
+        self.assertGreater(sum(float(value) for name, value in figures.items() if "operations_total" in name), 0, figures)
+        self.assertGreater(float(figures["fileindex_index_bytes{share=\"photos\"}"]), 100000)
+        text = machine.SCRATCH + "/fileindex.prom"
+        subprocess.check_call([CTL, "metrics", "--textfile", text])
+        self.assertEqual(subprocess.getoutput("grep -c '^# HELP' %s" % text), "10")
 
 
 if __name__ == "__main__":

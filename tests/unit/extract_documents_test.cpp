@@ -4,6 +4,7 @@
 #include <cstdlib>
 #include <functional>
 #include <random>
+#include <tuple>
 
 #include <gtest/gtest.h>
 
@@ -11,6 +12,8 @@
 #include "common/unique_fd.h"
 #include "extract/formats.h"
 #include "support/packed_files.h"
+#include "support/temp_dir.h"
+#include "vexo/content_extract.h"
 
 namespace {
 
@@ -311,6 +314,22 @@ TEST(ExtractDocuments, FindsTextAndFieldsOfEachFormat) {
     ASSERT_TRUE(quarrox::fromString(expected, document.fields)) << document.fields;
     EXPECT_EQ(quarrox::toString(found.fields), quarrox::toString(expected)) << document.type;
     EXPECT_EQ(found.damage, "") << document.type;
+  }
+}
+
+// Where no file may be opened, and nothing be written but memory.
+TEST(ExtractDocuments, AreReadByOtherProgramsInsideTheSandbox) {
+  const quarrox::support::TempDir dir;
+  Json::Value options(Json::objectValue);
+  options["need_meta"] = true;
+  const std::tuple<const char*, std::string, const char*> kFiles[] = {{"a.doc", WordFile(0), "Old w\xc3\xa4rld"},
+                                                                      {"a.xls", ExcelFile(), "Cell one"},
+                                                                      {"a.ppt", PowerPointFile(), "Slide one"}};
+  for (const auto& [name, bytes, text] : kFiles) {
+    quarrox::support::WriteText(dir / name, bytes);
+    Json::Value document(Json::objectValue);
+    VEXO::CONTENT_EXTRACT::ParseFile(dir / name, options, document);
+    EXPECT_EQ(Squeezed(document["VEXOMDTextContent"].asString()), text) << name;
   }
 }
 

@@ -207,6 +207,8 @@ CALL(bool, MonitorQueue::Delete, (const std::string& queue, const std::string& a
 namespace VEXO::CONTENT_EXTRACT {
 CALL(void, ParseFile, (const std::string& path, const Json::Value& options, Json::Value& document),
      throw std::runtime_error("cannot look at " + path), Merge(path, document), path, options["need_meta"].asString())
+PLAIN(std::string, LastFailure, (), world.last_read_failure)
+PLAIN(Json::Value, ReaderFeatures, (), Json::Value(Json::objectValue))
 }  // namespace VEXO::CONTENT_EXTRACT
 
 namespace quarrox::support {

@@ -97,6 +97,7 @@ class FakePlatform {
   // queue's directory is made only where its volume exists on the disk.
   std::map<std::string, Json::Value> monitors = {};
   std::map<std::string, Json::Value> documents = {};
+  std::string last_read_failure = "cannot be read";
 
   // The SMB service's search switch, and what VLIBShareConfigCheck finds wrong.
   bool spotlight = false;
