@@ -30,7 +30,7 @@ namespace {
 constexpr unsigned int kTimeForFile = 30;
 
 // A process that read so many files, or that holds so much memory (in bytes), has earned its rest: libraries leak.
-constexpr int kMostFiles = 1000;
+constexpr int kMostFiles = 10000;
 constexpr size_t kMostResident = size_t{256} << 20;
 
 constexpr const char* kText = "VEXOMDTextContent";
