@@ -76,6 +76,17 @@ std::vector<WordTerms> QueryWords(const Field& field, std::string_view text);
 // The same for a search in no particular field: each group has the word under every prefix where it may stand.
 std::vector<WordTerms> QueryWordsInAll(const Mapping& mapping, std::string_view text);
 
+// The prefixes under which a word may stand that is looked for in no particular field.
+std::vector<std::string> PrefixesOfAll(const Mapping& mapping);
+
+// A word of a text, or ideographs that stand together; folded, without a prefix.
+struct TextPiece {
+  std::string text;
+  bool ideographs;
+};
+
+std::vector<TextPiece> PiecesOf(std::string_view text);
+
 // The single term of an exact search: a keyword as it is, else the one word of `value`; empty where it has none or
 // several, and for numbers.
 std::string ExactTerm(const Field& field, std::string_view value);

@@ -57,6 +57,12 @@ class AskForWords {
   std::vector<WordTerms> words_;
 };
 
+struct ListPieces {
+  std::vector<TextPiece> pieces;
+  void Word(std::string_view word) { pieces.push_back({std::string(word), false}); }
+  void Ideographs(std::string_view signs) { pieces.push_back({std::string(signs), true}); }
+};
+
 // A word in a field of n-grams. One shorter than an n-gram stands for all n-grams that begin so.
 WordTerms AskForNgrams(const std::string& prefix, std::string_view word) {
   std::vector<std::string_view> ngrams;
@@ -98,11 +104,22 @@ std::vector<WordTerms> QueryWords(const Field& field, std::string_view text) {
 }
 
 std::vector<WordTerms> QueryWordsInAll(const Mapping& mapping, std::string_view text) {
+  return AskForWords(PrefixesOfAll(mapping)).Of(text);
+}
+
+std::vector<std::string> PrefixesOfAll(const Mapping& mapping) {
   std::vector<std::string> prefixes{std::string(kAllPrefix)};
   for (const Field& field : mapping.fields()) {
     if (field.in_all && HoldsPlainWords(field)) prefixes.push_back(PrefixOf(field));
   }
-  return AskForWords(std::move(prefixes)).Of(text);
+  return prefixes;
+}
+
+std::vector<TextPiece> PiecesOf(std::string_view text) {
+  ListPieces list;
+  WordSplitter splitter;
+  splitter.Split(text, list);
+  return std::move(list.pieces);
 }
 
 std::string ExactTerm(const Field& field, std::string_view value) {

@@ -2,6 +2,7 @@
 
 #include <xapian.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <iostream>
@@ -9,15 +10,10 @@
 #include <map>
 #include <sstream>
 
+#include "database_match.h"
+
 namespace quarrox::elasticd {
 namespace {
-
-// Where a document stands: the identifier of its directory and its name. Numbers follow, each in the slot of its field.
-constexpr Xapian::valueno kPlaceSlot = 0;
-constexpr Xapian::valueno kFirstNumberSlot = 1;
-
-// The first bytes of a place, the identifier in big-endian order.
-constexpr size_t kDirectoryBytes = sizeof(DirectoryId);
 
 // The library commits by itself after so many changes, in the middle of a document's; a transaction keeps it from that.
 constexpr bool kFlushed = true;
@@ -108,132 +104,6 @@ void ForEachMetadataKey(const Database& database, const std::string& prefix,
   for (Xapian::TermIterator key = database.metadata_keys_begin(prefix); key != end; ++key) {
     if (!take(*key)) return;
   }
-}
-
-// Lets documents through by their place.
-class PlaceSource final : public Xapian::ValuePostingSource {
- public:
-  PlaceSource(std::shared_ptr<const std::unordered_set<DirectoryId>> directories, std::string name)
-      : Xapian::ValuePostingSource(kPlaceSlot), directories_(std::move(directories)), name_(std::move(name)) {}
-
-  PlaceSource* clone() const override { return new PlaceSource(directories_, name_); }
-  std::string name() const override { return "PlaceSource"; }
-
-  void init(const Xapian::Database& database) override {
-    Xapian::ValuePostingSource::init(database);
-    set_maxweight(0);
-  }
-
-  void next(double) override {
-    Xapian::ValuePostingSource::next(0);
-    SkipOthers();
-  }
-
-  void skip_to(Xapian::docid id, double) override {
-    Xapian::ValuePostingSource::skip_to(id, 0);
-    SkipOthers();
-  }
-
-  bool check(Xapian::docid id, double) override {
-    skip_to(id, 0);
-    return true;
-  }
-
- private:
-  void SkipOthers() {
-    while (!at_end() && !IsWanted(get_value())) Xapian::ValuePostingSource::next(0);
-  }
-
-  bool IsWanted(const std::string& place) const {
-    if (place.size() < kDirectoryBytes || place.compare(kDirectoryBytes, name_.size(), name_) != 0) return false;
-    DirectoryId directory = 0;
-    for (size_t i = 0; i < kDirectoryBytes; ++i) directory = directory << 8 | static_cast<unsigned char>(place[i]);
-    return directories_->count(directory) != 0;
-  }
-
-  const std::shared_ptr<const std::unordered_set<DirectoryId>> directories_;
-  const std::string name_;
-};
-
-// One document by its identifier.
-class DocumentSource final : public Xapian::PostingSource {
- public:
-  explicit DocumentSource(Xapian::docid id) : id_(id) {}
-
-  DocumentSource* clone() const override { return new DocumentSource(id_); }
-  std::string name() const override { return "DocumentSource"; }
-  void init(const Xapian::Database&) override { state_ = kBefore; }
-  Xapian::doccount get_termfreq_min() const override { return 0; }
-  Xapian::doccount get_termfreq_est() const override { return 1; }
-  Xapian::doccount get_termfreq_max() const override { return 1; }
-  void next(double) override { state_ = state_ == kBefore ? kAt : kAfter; }
-  void skip_to(Xapian::docid id, double) override { state_ = id <= id_ ? kAt : kAfter; }
-  bool at_end() const override { return state_ == kAfter; }
-  Xapian::docid get_docid() const override { return id_; }
-
- private:
-  enum State { kBefore, kAt, kAfter };
-  const Xapian::docid id_;
-  State state_ = kBefore;
-};
-
-Xapian::Query Convert(const Query& query);
-
-std::vector<Xapian::Query> ConvertParts(const Query& query) {
-  std::vector<Xapian::Query> parts;
-  parts.reserve(query.parts.size());
-  for (const Query& part : query.parts) parts.push_back(Convert(part));
-  return parts;
-}
-
-Xapian::Query Combine(Xapian::Query::op op, const Query& query) {
-  const std::vector<Xapian::Query> parts = ConvertParts(query);
-  return Xapian::Query(op, parts.begin(), parts.end());
-}
-
-// The first of the parts, and all the others as one.
-Xapian::Query Combine(Xapian::Query::op op, const Query& query, Xapian::Query::op others) {
-  const std::vector<Xapian::Query> parts = ConvertParts(query);
-  if (parts.empty()) return Xapian::Query::MatchNothing;
-  return Xapian::Query(op, parts.front(), Xapian::Query(others, std::next(parts.begin()), parts.end()));
-}
-
-Xapian::Query ConvertNumber(const Query& query) {
-  const Xapian::valueno slot = kFirstNumberSlot + query.field;
-  return Xapian::Query(Xapian::Query::OP_VALUE_RANGE, slot, Xapian::sortable_serialise(query.low),
-                       Xapian::sortable_serialise(query.high));
-}
-
-// Nesting is bounded by the parser of queries.
-Xapian::Query Convert(const Query& query) {
-  using Xapian::Query;
-  switch (query.kind) {
-    case elasticd::Query::kNothing:
-      break;
-    case elasticd::Query::kEverything:
-      return Query::MatchAll;
-    case elasticd::Query::kTerm:
-      return Query(query.term);
-    case elasticd::Query::kBeginning:
-      return Query(Query::OP_WILDCARD, query.term);
-    case elasticd::Query::kNumber:
-      return ConvertNumber(query);
-    case elasticd::Query::kDocument:
-      return Query((new DocumentSource(query.document))->release());
-    case elasticd::Query::kPlace:
-      return Query((new PlaceSource(query.directories, query.term))->release());
-    case elasticd::Query::kAnd:
-      return Combine(Query::OP_AND, query);
-    case elasticd::Query::kOr:
-      return Combine(Query::OP_OR, query);
-    case elasticd::Query::kSame:
-      return Combine(Query::OP_SYNONYM, query);
-    case elasticd::Query::kAndNot:
-      return Combine(Query::OP_AND_NOT, query, Query::OP_OR);
-    case elasticd::Query::kAndPerhaps:
-      return Combine(Query::OP_AND_MAYBE, query, Query::OP_OR);
-  }
-  return Query::MatchNothing;
 }
 
 Xapian::doccount Bound(uint64_t number, uint64_t bound) {
@@ -394,25 +264,37 @@ std::string Reader::Place(DocumentId id) const {
   return Guard([&] { return impl_->database.get_document(id, Xapian::DOC_ASSUME_VALID).get_value(kPlaceSlot); });
 }
 
-SearchResult Reader::Search(const Query& query, const SearchOptions& options) const {
+SearchResult Reader::Search(Query query, const SearchOptions& options) const {
   return Guard([&] {
     Xapian::Enquire enquire(impl_->database);
-    enquire.set_query(Convert(query));
+    const Decider decider(query.TakeChecks());
+    Converter converter(impl_->database);
+    enquire.set_query(converter.Convert(query));
     Xapian::MultiValueKeyMaker keys;
     for (const auto& [field, descending] : options.sort) keys.add_value(kFirstNumberSlot + field, descending);
     if (!options.sort.empty()) enquire.set_sort_by_key_then_relevance(&keys, false);
     const uint64_t all = impl_->database.get_doccount();
     const Xapian::MSet found =
-        enquire.get_mset(Bound(options.from, all), Bound(options.size, all), Bound(kCountedHits, all));
+        enquire.get_mset(Bound(options.from, all), Bound(options.size, all), Bound(kCountedHits, all), nullptr,
+                         decider.is_needed() ? &decider : nullptr);
     SearchResult result;
     result.hits.reserve(found.size());
     for (Xapian::MSetIterator hit = found.begin(); hit != found.end(); ++hit) {
       result.hits.push_back({*hit, hit.get_weight()});
     }
     result.total = found.get_matches_estimated();
+    result.cut = converter.cut();
     result.exact = found.get_matches_lower_bound() == found.get_matches_upper_bound();
     return result;
   });
+}
+
+uint64_t Reader::CountWith(const std::string& term) const {
+  return Guard([&] { return impl_->database.get_termfreq(term); });
+}
+
+std::string Reader::Suggestion(const std::string& word) const {
+  return Guard([&] { return impl_->database.get_spelling_suggestion(word); });
 }
 
 bool IsSound(const std::string& directory) {

@@ -102,6 +102,7 @@ struct SearchResult {
   std::vector<Hit> hits;
   uint64_t total = 0;  // of all that match; an estimate where `exact` is false
   bool exact = true;
+  bool cut = false;  // a beginning of words stood for too many, and only the first of them were looked for
 };
 
 struct SearchOptions {
@@ -125,7 +126,13 @@ class Reader final : public Store {
   void ForEachKey(const std::string& prefix, const std::function<bool(const std::string&)>& take) const override;
   std::string Place(DocumentId id) const override;
 
-  SearchResult Search(const Query& query, const SearchOptions& options) const;
+  SearchResult Search(Query query, const SearchOptions& options) const;
+
+  // How many documents have a term.
+  uint64_t CountWith(const std::string& term) const;
+
+  // The word among the suggestions that is most like another one; empty where none is. Documents need not have it.
+  std::string Suggestion(const std::string& word) const;
 
  private:
   struct Impl;

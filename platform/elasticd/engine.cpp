@@ -62,6 +62,7 @@ SearchRequest ParseSearch(const Json::Value& query) {
     if (!query["sort"].isArray()) throw Error(kBadQuery, "\"sort\" must be an array");
     search.sort = query["sort"];
   }
+  search.suggest = query["suggest"].isBool() && query["suggest"].asBool();
   if (!query.isMember("load_field")) return search;
   const Json::Value& names = query["load_field"];
   if (!names.isArray()) throw Error(kBadQuery, "\"load_field\" must be an array of names");

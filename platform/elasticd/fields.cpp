@@ -207,6 +207,26 @@ KeptFields LoadFields(const Store& store, DocumentId id, Texts texts) {
   return fields;
 }
 
+void ForEachText(const Store& store, const Mapping& mapping, DocumentId id,
+                 const std::function<bool(std::string_view text)>& take) {
+  const KeptFields kept = LoadFields(store, id, Texts::kBoth);
+  const auto take_one = [&](const Json::Value& value) {
+    const char* begin = nullptr;
+    const char* end = nullptr;
+    return !value.getString(&begin, &end) || take({begin, static_cast<size_t>(end - begin)});
+  };
+  for (const Json::Value* part : {&kept.texts, &kept.plain}) {
+    for (auto field = part->begin(); field != part->end(); ++field) {
+      const Field known = mapping.Get(field.name());
+      if (!known.in_all || known.IsNumber()) continue;
+      if (!field->isArray() && !take_one(*field)) return;
+      for (auto text = field->begin(); field->isArray() && text != field->end(); ++text) {
+        if (!take_one(*text)) return;
+      }
+    }
+  }
+}
+
 void DropFields(Writer& writer, DocumentId id) {
   writer.Set(FieldsKey(id), {});
   writer.Set(TextsKey(id), {});

@@ -1,7 +1,9 @@
 // The fields of a document as they are kept: what is given back when a document is loaded.
 #pragma once
 
+#include <functional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include <json/json.h>
@@ -54,6 +56,10 @@ enum class Texts { kBoth, kLeave };
 void SaveFields(Writer& writer, DocumentId id, const KeptFields& fields, Texts texts);
 KeptFields LoadFields(const Store& store, DocumentId id, Texts texts);
 void DropFields(Writer& writer, DocumentId id);
+
+// Hands out the texts of a document that searches in no particular field look at, until `take` returns false.
+void ForEachText(const Store& store, const Mapping& mapping, DocumentId id,
+                 const std::function<bool(std::string_view text)>& take);
 
 // What people are handed out of a document: the fields by these names that it has and the mapping stores; every stored
 // one where `names` is empty. Null where there is no such document any more.

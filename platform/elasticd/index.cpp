@@ -412,7 +412,8 @@ void Index::RemoveMatching(const Json::Value& qsl) {
     open.pending = 0;
     const Reader reader(files_.Database());
     const Places places(reader);
-    const Query parsed = QueryParser(mapping_, path_fields_, places).Parse(qsl);
+    QueryParser parser(mapping_, path_fields_, reader, places);
+    const Query parsed = parser.Parse(qsl);
     for (const Hit& hit : reader.Search(parsed, SearchOptions()).hits) {
       Drop(open, hit.id, open.places.PathOf(UnpackPlace(open.writer.Place(hit.id))));
       Account(open, 0);
@@ -477,6 +478,7 @@ void Index::AddSuggestions(const std::string& path) {
     if (id == 0) throw Error(kNoSuchDocument, "There is no document of " + path);
     const KeptFields fields = LoadFields(open.writer, id, Texts::kBoth);
     for (const Json::Value* part : {&fields.plain, &fields.texts}) {
+      if (part->isNull()) continue;
       for (const std::string& word :
            SuggestionWords(mapping_, open.analyzer.Analyze(*part, path_fields_.unindexed()))) {
         open.writer.AddSuggestion(word);

@@ -30,7 +30,10 @@ struct SearchRequest {
   uint64_t from = 0;
   uint64_t size = ~uint64_t{0};
   Json::Value sort;
+  bool suggest = false;  // where hardly anything is found, look for words that were meant
 };
+
+struct Searches;
 
 // Thread-safe. Changes and look-ups by path go one by one and see every change that was accepted; searches go one by
 // one beside them and see what was committed. The document commands throw Error: 608 while a damaged database is looked
@@ -100,7 +103,6 @@ class Index {
   static constexpr int kMostWaiting = 64;
 
   struct Open;  // the database while it is in use
-  struct Searches;
 
   enum class Access { kLook, kChange };
 

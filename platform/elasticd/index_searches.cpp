@@ -5,12 +5,22 @@
 #include "common/json.h"
 #include "error_code.h"
 #include "query_parser.h"
+#include "snippet.h"
 
 namespace quarrox::elasticd {
 namespace {
 
 // Asks for how good a hit is, as if that were a field.
 constexpr char kScore[] = "_score";
+
+// Asks for the piece of a text that shows why it was found: {"text", "marks": [[OFFSET, LENGTH], ...]}, in bytes.
+constexpr char kSnippet[] = "_snippet";
+
+// Where fewer are found, perhaps another word was meant.
+constexpr uint64_t kLittle = 3;
+
+// A word that some documents have was meant all the same, unless so many times more have another one.
+constexpr uint64_t kMuchMore = 10;
 
 // A search that meets commit after commit is tried again so often.
 constexpr int kMostRefreshes = 20;
@@ -45,6 +55,111 @@ auto Retry(Reader& reader, Places& places, Read read) {
   }
 }
 
+// What of a hit is handed out.
+class HitWriter {
+ public:
+  HitWriter(Searches& searches, const Mapping& mapping, const PathFields& path_fields, std::vector<std::string> names,
+            const std::vector<LineWord>& words)
+      : searches_(searches), mapping_(mapping), path_fields_(path_fields), names_(std::move(names)) {
+    with_score_ = std::erase(names_, kScore) != 0;
+    with_snippet_ = std::erase(names_, kSnippet) != 0;
+    for (const LineWord& each : words) {
+      for (const TextPiece& piece : each.pieces) {
+        snippet_words_.Add(piece, each.beginning && &piece == &each.pieces.back());
+      }
+    }
+  }
+
+  // Null where the document was deleted since.
+  Json::Value Show(const Hit& hit) {
+    const std::string packed = searches_.reader.Place(hit.id);
+    if (packed.empty()) return Json::Value();
+    const Place place = UnpackPlace(packed);
+    const std::string directory = searches_.places.DirectoryPath(place.directory);
+    const bool plain = names_.empty() && (with_score_ || with_snippet_);
+    Json::Value fields =
+        plain ? Json::Value(Json::objectValue)
+              : ShowFields(searches_.reader, mapping_, path_fields_, hit.id, directory, place.name, names_);
+    if (fields.isNull()) return fields;
+    if (with_score_) fields[kScore] = hit.score;
+    if (with_snippet_ && !snippet_words_.empty()) ShowSnippet(hit.id, place.name, fields);
+    return fields;
+  }
+
+ private:
+  // Of the first text that has one of the words; long texts come first.
+  void ShowSnippet(DocumentId id, const std::string& name, Json::Value& shown) const {
+    Snippet found;
+    ForEachText(searches_.reader, mapping_, id, [&](std::string_view text) {
+      if (text != name) found = snippet_words_.Find(text);
+      return found.text.empty();
+    });
+    if (found.text.empty()) return;
+    Json::Value& snippet = shown[kSnippet];
+    snippet["text"] = found.text;
+    snippet["marks"] = Json::Value(Json::arrayValue);
+    for (const auto& [offset, length] : found.marks) {
+      Json::Value mark(Json::arrayValue);
+      mark.append(Json::UInt64{offset});
+      mark.append(Json::UInt64{length});
+      snippet["marks"].append(mark);
+    }
+  }
+
+  Searches& searches_;
+  const Mapping& mapping_;
+  const PathFields& path_fields_;
+  std::vector<std::string> names_;
+  bool with_score_ = false;
+  bool with_snippet_ = false;
+  SnippetWords snippet_words_;
+};
+
+// How many documents have a word that is looked for in no particular field; of those that have it under several
+// prefixes, the most under one.
+uint64_t CountWith(const Reader& reader, const Mapping& mapping, const std::string& word) {
+  uint64_t most = 0;
+  for (const std::string& prefix : PrefixesOfAll(mapping)) most = std::max(most, reader.CountWith(prefix + word));
+  return most;
+}
+
+// The line in a query as the command asks it: alone, or first among what must be.
+Json::Value* FindLine(Json::Value& qsl) {
+  Json::Value* at = &qsl;
+  const auto step = [&at](const char* member) {
+    const bool has = at->isObject() && at->isMember(member);
+    if (has) at = &(*at)[member];
+    return has;
+  };
+  if (step("bool")) {
+    if (!step("must") || !at->isArray() || at->empty()) return nullptr;
+    at = &(*at)[0];
+  }
+  if (!step("query_string")) return nullptr;
+  step("query");
+  return at->isString() ? at : nullptr;
+}
+
+// The line with words that documents have in place of those that none has, where that finds more; else empty.
+std::string Suggest(const Reader& reader, const Mapping& mapping, QueryParser& parser, Json::Value qsl,
+                    const std::vector<LineWord>& words, uint64_t found) {
+  Json::Value* const line = FindLine(qsl);
+  if (line == nullptr) return {};
+  std::string changed = line->asString();
+  for (auto word = words.rbegin(); word != words.rend(); ++word) {
+    if (word->pieces.size() != 1 || word->pieces.front().ideographs || word->beginning) continue;
+    const uint64_t known = CountWith(reader, mapping, word->pieces.front().text);
+    const std::string meant = reader.Suggestion(word->pieces.front().text);
+    if (meant.empty() || CountWith(reader, mapping, meant) <= known * kMuchMore) continue;
+    const bool quoted = changed[word->begin] == '"';
+    changed.replace(word->begin, word->end - word->begin, quoted ? '"' + meant + '"' : meant);
+  }
+  if (changed == line->asString()) return {};
+  *line = changed;
+  const SearchOptions none{0, 0, {}};
+  return reader.Search(parser.Parse(qsl), none).total > found ? changed : std::string();
+}
+
 }  // namespace
 
 void AppendElement(Answer& answer, bool& first, const Json::Value& value) {
@@ -65,30 +180,25 @@ void Index::SearchCommitted(const SearchRequest& request, Answer& answer) {
   }
   Reader& reader = searches_->reader;
   Places& places = searches_->places;
+  QueryParser parser(mapping_, path_fields_, reader, places);
   const SearchOptions options{request.from, request.size, ParseSort(mapping_, request.sort)};
-  const SearchResult result = Retry(reader, places, [&] {
-    return reader.Search(QueryParser(mapping_, path_fields_, places).Parse(request.qsl), options);
-  });
+  const SearchResult result = Retry(reader, places, [&] { return reader.Search(parser.Parse(request.qsl), options); });
 
-  std::vector<std::string> names = request.load_fields;
-  const bool with_score = std::erase(names, kScore) != 0;
+  HitWriter writer(*searches_, mapping_, path_fields_, request.load_fields, parser.line_words());
   answer.Append("[");
   bool first = true;
   for (const Hit& hit : result.hits) {
-    Json::Value fields = Retry(reader, places, [&] {
-      const std::string packed = reader.Place(hit.id);
-      if (packed.empty()) return Json::Value();  // deleted since
-      const Place place = UnpackPlace(packed);
-      const std::string directory = places.DirectoryPath(place.directory);
-      if (names.empty() && with_score) return Json::Value(Json::objectValue);
-      return ShowFields(reader, mapping_, path_fields_, hit.id, directory, place.name, names);
-    });
-    if (fields.isNull()) continue;
-    if (with_score) fields[kScore] = hit.score;
-    AppendElement(answer, first, fields);
+    const Json::Value fields = Retry(reader, places, [&] { return writer.Show(hit); });
+    if (!fields.isNull()) AppendElement(answer, first, fields);
   }
   answer.Append("],\"total\":" + std::to_string(result.total));
   answer.Append(result.exact ? ",\"exact\":true" : ",\"exact\":false");
+  if (result.cut || parser.cut()) answer.Append(",\"cut\":true");
+  if (!request.suggest || result.total >= kLittle) return;
+  const std::vector<LineWord> words = parser.line_words();
+  const auto suggestion =
+      Retry(reader, places, [&] { return Suggest(reader, mapping_, parser, request.qsl, words, result.total); });
+  if (!suggestion.empty()) answer.Append(",\"suggestion\":" + toString(Json::Value(suggestion)));
 }
 
 void Index::Search(const SearchRequest& request, Answer& answer) {

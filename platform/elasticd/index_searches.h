@@ -7,7 +7,7 @@
 
 namespace quarrox::elasticd {
 
-struct Index::Searches {
+struct Searches {
   explicit Searches(const std::string& directory) : reader(directory), places(reader) {}
 
   void Refresh() {

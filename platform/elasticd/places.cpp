@@ -250,6 +250,41 @@ std::unordered_set<DirectoryId> Places::TreesIn(DirectoryId top, std::string_vie
   return tree;
 }
 
+std::unordered_set<DirectoryId> Places::TreesThatFit(size_t count, bool from_root, const Fits& fits) const {
+  std::unordered_map<DirectoryId, Branch> branches;
+  store_.ForEachKey(std::string(1, kBranchKey), [&](const std::string& key) {
+    std::string_view number = std::string_view(key).substr(1);
+    const DirectoryId directory = TakeNumber(number);
+    return branches.emplace(directory, LookUp(directory)).second;
+  });
+  const auto is_top = [&](DirectoryId directory) {
+    for (size_t left = count; left > 0; --left) {
+      const auto at = branches.find(directory);
+      if (at == branches.end() || !fits(left - 1, at->second.name)) return false;
+      directory = at->second.above;
+    }
+    return !from_root || directory == kRoot;
+  };
+  std::unordered_map<DirectoryId, bool> inside = {{kRoot, false}};
+  std::unordered_set<DirectoryId> trees;
+  for (const auto& [directory, branch] : branches) {
+    std::vector<DirectoryId> way;  // up to the first directory of which it is known
+    DirectoryId at = directory;
+    for (; !inside.contains(at); at = branches.at(at).above) {
+      if (way.size() > branches.size() || !branches.contains(at)) {
+        throw DamagedDatabase("a directory has no end above it");
+      }
+      way.push_back(at);
+    }
+    bool is_inside = inside.at(at);
+    for (auto step = way.rbegin(); step != way.rend(); ++step) {
+      is_inside = inside[*step] = is_inside || is_top(*step);
+      if (is_inside) trees.insert(*step);
+    }
+  }
+  return trees;
+}
+
 DirectoryId PlaceWriter::FindDirectory(std::string_view path) const {
   const std::string key(path);
   const auto known = directories_.find(key);

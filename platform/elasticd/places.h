@@ -64,6 +64,11 @@ class Places {
   // The directories in `top` whose names begin so, and all below them.
   std::unordered_set<DirectoryId> TreesIn(DirectoryId top, std::string_view begin) const;
 
+  // The directories of which the last `count` components fit, and all below them; `from_root` where nothing may stand
+  // above these. Looks at every directory.
+  using Fits = std::function<bool(size_t component, const std::string& name)>;
+  std::unordered_set<DirectoryId> TreesThatFit(size_t count, bool from_root, const Fits& fits) const;
+
   // To be called where directories may have changed under the object.
   void Forget() { paths_.clear(); }
 

@@ -1,7 +1,9 @@
 #include "query_parser.h"
 
+#include <algorithm>
 #include <charconv>
 #include <cmath>
+#include <ctime>
 #include <limits>
 
 #include "analysis.h"
@@ -98,11 +100,13 @@ Query InDirectories(std::unordered_set<DirectoryId> directories, std::string_vie
 
 }  // namespace
 
-Query QueryParser::Parse(const Json::Value& qsl) const {
+Query QueryParser::Parse(const Json::Value& qsl) {
+  lines_.clear();
+  line_words_.clear();
   return ParseAt(qsl, 0);
 }
 
-Query QueryParser::ParseAt(const Json::Value& qsl, int depth) const {
+Query QueryParser::ParseAt(const Json::Value& qsl, int depth) {
   if (depth > kDeepest) Fail("The query is nested more than " + std::to_string(kDeepest) + " levels deep");
   const Member query = OnlyMember(qsl, "A query");
   if (query.name == "bool") return Bool(query.value, depth);
@@ -222,7 +226,7 @@ Query QueryParser::Range(const std::string& name, const Json::Value& bounds) con
   return NumberRange(field, low, high);
 }
 
-Query QueryParser::Bool(const Json::Value& clauses, int depth) const {
+Query QueryParser::Bool(const Json::Value& clauses, int depth) {
   if (!clauses.isObject()) Fail("bool must be an object with must, should or must_not");
   std::vector<Query> must;
   std::vector<Query> should;
@@ -257,41 +261,25 @@ Query QueryParser::Bool(const Json::Value& clauses, int depth) const {
   return Query::Of(Query::kAndNot, std::move(must_not));
 }
 
-Query QueryParser::Beginnings(std::string_view word) const {
-  std::vector<Query> terms;
-  for (const WordTerms& parts : QueryWordsInAll(mapping_, word)) {
-    Query query = OfWord(parts);
-    if (query.kind == Query::kSame) {
-      for (Query& part : query.parts) part.kind = Query::kBeginning;
-    }
-    terms.push_back(std::move(query));
+// What goes with the line is optional: {"query": LINE, "types": {NAME: [EXTENSION, ...]}, "now": SECONDS}.
+Query QueryParser::Line(const Json::Value& value) {
+  const std::string line = Text("query_string", value.isObject() ? value["query"] : value);
+  LineSettings settings;
+  settings.now = time(nullptr);
+  if (value.isObject() && value["now"].isInt64()) settings.now = value["now"].asInt64();
+  const Json::Value types = value.isObject() ? value["types"] : Json::Value();
+  if (!types.isNull() && !types.isObject()) Fail("types must be an object");
+  for (auto type = types.begin(); type != types.end(); ++type) {
+    for (const Json::Value& extension : *type) settings.types[type.name()].push_back(Text("types", extension));
   }
-  return Simplify(Query::kAnd, std::move(terms));
+  LineQuery& made = lines_.emplace_back(mapping_, store_, places_, std::move(settings));
+  Query query = made.Make(line);
+  line_words_.insert(line_words_.end(), made.words().begin(), made.words().end());
+  return query;
 }
 
-Query QueryParser::Line(const Json::Value& value) const {
-  const Json::Value& query = value.isObject() ? value["query"] : value;
-  const std::string line = Text("query_string", query);
-  std::vector<Query> wanted;
-  std::vector<Query> unwanted;
-  constexpr std::string_view kBlanks = " \t\r\n\v\f";
-  for (size_t begin = line.find_first_not_of(kBlanks); begin != std::string::npos;) {
-    const size_t end = std::min(line.find_first_of(kBlanks, begin), line.size());
-    std::string_view word = std::string_view(line).substr(begin, end - begin);
-    begin = line.find_first_not_of(kBlanks, end);
-    const bool is_unwanted = word.size() > 1 && word.front() == '-';
-    if (is_unwanted) word.remove_prefix(1);
-    Query part = word.back() == '*' ? Beginnings(word) : WordsInAll(word);
-    if (part.kind == Query::kNothing) continue;  // no letter in it
-    (is_unwanted ? unwanted : wanted).push_back(std::move(part));
-    if (wanted.size() + unwanted.size() > kMostWords) {
-      Fail("The query has more than " + std::to_string(kMostWords) + " words");
-    }
-  }
-  if (unwanted.empty()) return Simplify(Query::kAnd, std::move(wanted));
-  unwanted.insert(unwanted.begin(),
-                  wanted.empty() ? Query{Query::kEverything} : Simplify(Query::kAnd, std::move(wanted)));
-  return Query::Of(Query::kAndNot, std::move(unwanted));
+bool QueryParser::cut() const {
+  return std::any_of(lines_.begin(), lines_.end(), [](const LineQuery& line) { return line.cut(); });
 }
 
 std::optional<PathQuery> AsPathQuery(const Json::Value& qsl, const Mapping& mapping) {

@@ -136,7 +136,8 @@ fi
 
 echo "  Words find files; all words must be there. Files in ${QUICKSTART_OWN} may be changed meanwhile."
 help() {
-  echo "    WORDS       files with all of these words; -WORD: without it; WORD*: that begin so"
+  echo "    WORDS       files with all of these words; -WORD: without it; WORD*: that begin so;"
+  echo "                \"A PHRASE\", A OR B, name:PART, ext:pdf, type:document, size:>1M, date:7d, path:DIR"
   echo "    :name TEXT  files with a part of their names"
   echo "    :status     what is indexed and what waits"
   echo "    :quit       the end, as Ctrl-D"

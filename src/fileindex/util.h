@@ -88,4 +88,7 @@ enum FileType {
 // By the lower-cased extension of the last component.
 QUARROX_API FileType GetFileTypeByFullPath(const std::string& full_path);
 
+// The extensions of a type, in order.
+QUARROX_API std::vector<std::string> ExtensionsOfFileType(FileType type);
+
 }  // namespace quarrox::fileindex

@@ -104,4 +104,12 @@ FileType GetFileTypeByFullPath(const std::string& full_path) {
   return found != table.end() && found->extension == extension ? found->type : kFileTypeOther;
 }
 
+std::vector<std::string> ExtensionsOfFileType(FileType type) {
+  std::vector<std::string> extensions;
+  for (const Entry& entry : Extensions()) {
+    if (entry.type == type) extensions.emplace_back(entry.extension);
+  }
+  return extensions;
+}
+
 }  // namespace quarrox::fileindex

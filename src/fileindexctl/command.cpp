@@ -71,8 +71,9 @@ const std::vector<Command> kCommands = {
     {"resume", "", "[--json]", "end a pause", {"--json"}, 0, Resume},
     {"search",
      "",
-     "[--share SHARE] [--name] [--type EXTENSION,...] [--limit N] [--offset N] [--json] QUERY",
-     "find files by their words, or with --name by a part of their names; the best of them first",
+     "[--share SHARE] [--name] [--type TYPE,...] [--limit N] [--offset N] [--json] QUERY",
+     "find files by words, phrases, name, type, size, date and place, or with --name by parts of their names; best "
+     "first",
      {"--share=", "--name", "--type=", "--limit=", "--offset=", "--json"},
      1,
      Search},

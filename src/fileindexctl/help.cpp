@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "output.h"
+#include "search.h"
 
 namespace quarrox::ctl {
 namespace {
@@ -29,7 +30,7 @@ const std::pair<const char*, const char*> kOptionTexts[] = {
     {"--sort=", "what they are sorted by; path without it"},
     {"--summary", "print only the counts"},
     {"--textfile=", "write a file, as a whole, instead"},
-    {"--type=", "only files with one of these extensions, with commas between them"},
+    {"--type=", "only files of one of these types or with one of these extensions, with commas between them"},
     {"--types=", "the kinds of files that are indexed, with commas between them"},
     {"--until-idle", "follow only until nothing is left to be done; status 1 where a share waits for over a minute"},
     {"--wait=", "let pending work end first, for so long"},
@@ -66,6 +67,7 @@ void PrintOne(std::ostream& out, const Command& command) {
   std::vector<std::vector<std::string>> rows;
   for (const std::string& option : command.options) rows.push_back({"  " + AsWritten(command, option), TextOf(option)});
   if (!rows.empty()) PrintTable(out, rows);
+  if (command.run == Search) PrintSearchLanguage(out);
 }
 
 // --- the manual page -------------------------------------------------------------------------------------------------

@@ -1,11 +1,15 @@
+#include "search.h"
+
 #include <unistd.h>
 
 #include <algorithm>
 #include <cstdint>
-#include <ctime>
+#include <cstdlib>
 #include <iostream>
+#include <iterator>
 #include <set>
 #include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -17,6 +21,7 @@
 #include "common/strings.h"
 #include "fileindex/elastic_control.h"
 #include "fileindex/folder_mgr.h"
+#include "fileindex/util.h"
 #include "output.h"
 
 namespace quarrox::ctl {
@@ -24,47 +29,90 @@ namespace {
 
 constexpr size_t kDefaultLimit = 10;
 
-struct Hit {
-  std::string share = {};
-  std::string path = {};
-  bool is_directory = false;
-  int64_t size = 0;     // bytes
-  int64_t changed = 0;  // seconds since the epoch
-  double score = 0;
+// No terminal shows a column behind it on the same line.
+constexpr unsigned long long kWidest = 200;
+
+constexpr const char* kFields[] = {"VEXOMDPath", "VEXOMDIsDir", "VEXOMDFSSize", "VEXOMDFSContentChangeDate", "_score"};
+
+// A longer list is for programs, and each snippet costs a look at a text.
+constexpr uint64_t kMostSnippets = 1000;
+
+// Where fewer are found in all shares, perhaps another word was meant.
+constexpr uint64_t kLittle = 3;
+
+// So many hits of a share, and how many before them are passed over.
+struct Page {
+  uint64_t from = 0;
+  uint64_t size = 0;
 };
 
-struct Found {
-  std::vector<Hit> hits = {};  // the best of each share
-  uint64_t total = 0;
-  bool total_is_exact = true;
-};
+// The types of files by the names that people call them by.
+constexpr std::pair<const char*, fileindex::FileType> kTypes[] = {{"document", fileindex::kFileTypeDocument},
+                                                                  {"audio", fileindex::kFileTypeAudio},
+                                                                  {"video", fileindex::kFileTypeVideo},
+                                                                  {"photo", fileindex::kFileTypePhoto}};
 
-Json::Value Query(const char* kind, const char* field, const std::string& text) {
+bool IsType(const std::string& name) {
+  return name == "folder" ||
+         std::any_of(std::begin(kTypes), std::end(kTypes), [&](const auto& type) { return name == type.first; });
+}
+
+std::string Quoted(const std::string& text) {
+  std::string quoted = "\"";
+  for (const char c : text) {
+    if (c == '"' || c == '\\') quoted += '\\';
+    quoted += c;
+  }
+  return quoted + '"';
+}
+
+// The words between some characters, without empty ones.
+std::vector<std::string> Split(const std::string& text, const char* between) {
+  std::vector<std::string> words;
+  for (size_t begin = text.find_first_not_of(between); begin != std::string::npos;) {
+    const size_t end = std::min(text.find_first_of(between, begin), text.size());
+    words.push_back(text.substr(begin, end - begin));
+    begin = text.find_first_not_of(between, end);
+  }
+  return words;
+}
+
+// Types go along where the line may ask for them: the engine does not know which extensions they stand for.
+Json::Value Line(const std::string& line) {
   Json::Value query(Json::objectValue);
-  query[kind][field] = text;
+  Json::Value& settings = query["query_string"];
+  settings["query"] = line;
+  if (ToLower(line).find("type:") == std::string::npos) return query;
+  for (const auto& [name, type] : kTypes) {
+    Json::Value& extensions = settings["types"][name];
+    for (const std::string& extension : fileindex::ExtensionsOfFileType(type)) extensions.append(extension);
+  }
   return query;
 }
 
-// Any of some extensions, with a comma between two.
-Json::Value WithExtensions(const std::string& extensions) {
-  Json::Value any(Json::objectValue);
-  for (size_t begin = 0; begin <= extensions.size();) {
-    const size_t end = std::min(extensions.find(',', begin), extensions.size());
-    const std::string extension = ToLower(extensions.substr(begin, end - begin));
-    any["bool"]["should"].append(Query("term", "VEXOMDExtension", extension));
-    begin = end + 1;
+// Each word is a part of the name.
+std::string ForNames(const std::string& text) {
+  std::string line;
+  for (const std::string& word : Split(text, " \t\r\n\v\f")) line += "name:" + Quoted(word) + ' ';
+  return line;
+}
+
+// Any of some types or extensions, with a comma between two.
+std::string ForTypes(const std::string& list) {
+  std::string line;
+  for (const std::string& type : Split(list, ",")) {
+    line += (line.empty() ? "" : " OR ") + std::string(IsType(type) ? "type:" : "ext:") + Quoted(type);
   }
-  return any;
+  return line;
 }
 
 Json::Value AsQuery(const Arguments& arguments) {
   const std::string& text = arguments.operands().front();
-  Json::Value query =
-      arguments.Has("--name") ? Query("match", "VEXOMDSearchFileName", text) : Query("query_string", "query", text);
+  Json::Value query = Line(arguments.Has("--name") ? ForNames(text) : text);
   if (!arguments.Has("--type")) return query;
   Json::Value both(Json::objectValue);
   both["bool"]["must"].append(query);
-  both["bool"]["must"].append(WithExtensions(arguments.Value("--type", "")));
+  both["bool"]["must"].append(Line(ForTypes(arguments.Value("--type", ""))));
   return both;
 }
 
@@ -80,88 +128,77 @@ Hit AsHit(const std::string& share, const Json::Value& fields) {
   hit.size = static_cast<int64_t>(NumberOf(fields, "VEXOMDFSSize"));
   hit.changed = static_cast<int64_t>(NumberOf(fields, "VEXOMDFSContentChangeDate"));
   hit.score = NumberOf(fields, "_score");
+  const Json::Value& snippet = fields["_snippet"];
+  if (!snippet.isObject()) return hit;
+  GetJsonValue(hit.snippet, snippet, "text", false);
+  for (const Json::Value& mark : snippet["marks"]) {
+    if (mark.isArray() && mark.size() == 2) hit.marks.emplace_back(mark[0].asUInt64(), mark[1].asUInt64());
+  }
   return hit;
 }
 
-void SearchShare(const std::string& share, const Json::Value& qsl, uint64_t wanted, Found& found) {
+// What cannot be read is shown below the line on a terminal.
+[[noreturn]] void RefuseLine(const std::string& line, const std::string& message) {
+  constexpr std::string_view kBeforeColumn = "column ";
+  const size_t at = message.find(kBeforeColumn);
+  const std::string reason = at == std::string::npos ? message : message.substr(at);
+  if (at != std::string::npos && isatty(STDERR_FILENO) == 1) {
+    const auto column = strtoull(reason.c_str() + kBeforeColumn.size(), nullptr, 10);
+    if (column > 0 && column < kWidest) {
+      std::cerr << "  " << Visible(line) << "\n  " << std::string(column - 1, ' ') << "^\n";
+    }
+  }
+  throw Error(ErrorCode{kElasticdBadQuery}, reason);
+}
+
+void SearchShare(const std::string& share, const Json::Value& qsl, Page page, Found& found) {
   Json::Value request(Json::objectValue);
   request["command"] = "document_get_by_query";
   request["data"]["id"] = fileindex::elastic::GetFileIndexID(share);
   Json::Value& query = request["data"]["query"];
   query["qsl"] = qsl;
-  for (const char* field : {"VEXOMDPath", "VEXOMDIsDir", "VEXOMDFSSize", "VEXOMDFSContentChangeDate", "_score"}) {
-    query["load_field"].append(field);
-  }
-  query["from"] = 0;
-  query["size"] = Json::UInt64{wanted};
+  for (const char* field : kFields) query["load_field"].append(field);
+  if (page.size <= kMostSnippets) query["load_field"].append("_snippet");
+  query["suggest"] = true;
+  query["from"] = Json::UInt64{page.from};
+  query["size"] = Json::UInt64{page.size};
   Json::Value response;
   SendRequestImpl(response, request);
   const Json::Value& hits = std::as_const(response)["data"];
   if (!hits.isArray()) throw Error(kErrEngineNoData, toString(response));
   for (const Json::Value& hit : hits) found.hits.push_back(AsHit(share, hit));
-  found.total += std::max(static_cast<uint64_t>(NumberOf(response, "total")), uint64_t{hits.size()});
-  const Json::Value& exact = std::as_const(response)["exact"];
-  if (exact.isBool() && !exact.asBool()) found.total_is_exact = false;
+  found.total +=
+      std::max(static_cast<uint64_t>(NumberOf(response, "total")), hits.empty() ? 0 : page.from + hits.size());
+  const auto has = [&](const char* name, bool value) {
+    const Json::Value& member = std::as_const(response)[name];
+    return member.isBool() && member.asBool() == value;
+  };
+  if (has("exact", false)) found.total_is_exact = false;
+  if (has("cut", true)) found.cut = true;
+  if (found.suggestion.empty()) GetJsonValue(found.suggestion, response, "suggestion", false);
 }
 
-Found SearchShares(const std::set<std::string>& shares, const Json::Value& qsl, uint64_t wanted) {
+Found SearchShares(const std::set<std::string>& shares, const std::string& line, const Json::Value& qsl, Page page) {
   // The channel waits for an engine that is about to start; a person need not.
   if (access(kElasticdSocketPath, F_OK) != 0) throw Error(kErrEngineReceive, "the search engine is not running");
   Found found;
   for (const std::string& share : shares) {
     try {
-      SearchShare(share, qsl, wanted, found);
+      SearchShare(share, qsl, page, found);
     } catch (const Error& error) {
+      if (int{error.code} == kElasticdBadQuery) RefuseLine(line, error.reason);
       const bool is_paused = int{error.code} == kElasticdIndexPaused;
       if (!is_paused && int{error.code} != kElasticdNoSuchIndex) throw;
       std::cerr << "fileindexctl: the share " << Visible(share) << (is_paused ? " is paused" : " has no index yet")
                 << ", so it is left out\n";
     }
   }
-  std::sort(found.hits.begin(), found.hits.end(),
-            [](const Hit& a, const Hit& b) { return a.score != b.score ? a.score > b.score : a.path < b.path; });
+  std::stable_sort(found.hits.begin(), found.hits.end(), [](const Hit& a, const Hit& b) { return a.score > b.score; });
+  if (found.total >= kLittle) found.suggestion.clear();  // one share's, while others have it
+  if (found.cut) {
+    std::cerr << "fileindexctl: the query fits too much to look at all of it; more letters or words make it exact\n";
+  }
   return found;
-}
-
-std::string AsJson(const Hit& hit) {
-  Json::Value object;
-  object["share"] = hit.share;
-  object["path"] = hit.path;
-  object["is_dir"] = hit.is_directory;
-  object["size"] = Json::Int64{hit.size};
-  object["changed"] = Json::Int64{hit.changed};
-  object["score"] = hit.score;
-  return toString(object);
-}
-
-std::string SizeOf(const Hit& hit) {
-  if (hit.is_directory) return "directory";
-  return SizeText(static_cast<uint64_t>(std::max<int64_t>(hit.size, 0)));
-}
-
-std::string DateOf(const Hit& hit) {
-  const time_t time = hit.changed;
-  tm parts = {};
-  char text[32] = "";
-  if (localtime_r(&time, &parts) != nullptr) strftime(text, sizeof(text), "%Y-%m-%d %H:%M", &parts);
-  return text;
-}
-
-void PrintHits(const Found& found, size_t offset) {
-  const std::vector<Hit>& hits = found.hits;
-  if (found.total == 0) {
-    std::cout << "nothing found\n";
-    return;
-  }
-  std::vector<std::vector<std::string>> rows = {{"PATH", "SIZE", "CHANGED"}};
-  for (const Hit& hit : hits) rows.push_back({Visible(hit.path), SizeOf(hit), DateOf(hit)});
-  if (rows.size() > 1) PrintTable(std::cout, rows);
-  const char* about = found.total_is_exact ? "" : "about ";
-  if (hits.empty()) {
-    std::cout << about << found.total << " found, none from " << offset << " on\n";
-  } else {
-    std::cout << offset + 1 << " to " << offset + hits.size() << " of " << about << found.total << '\n';
-  }
 }
 
 }  // namespace
@@ -170,7 +207,7 @@ int Search(const Arguments& arguments) {
   if (Trim(arguments.operands().front()).empty()) throw UsageError("QUERY is empty");
   const size_t offset = arguments.Number("--offset", 0);
   const size_t limit = arguments.Number("--limit", kDefaultLimit);
-  const size_t wanted = offset + std::min(limit, SIZE_MAX - offset);
+  const size_t end = offset + std::min(limit, SIZE_MAX - offset);
   std::set<std::string> shares;
   if (arguments.Has("--share")) {
     shares = {sdk::SDKShare(arguments.Value("--share", "")).GetName()};
@@ -179,12 +216,14 @@ int Search(const Arguments& arguments) {
   }
   if (shares.empty()) std::cerr << "fileindexctl: no folder is indexed\n";
 
-  Found found = SearchShares(shares, AsQuery(arguments), wanted);
+  // The best of several shares are known when the best of each are.
+  const size_t begin = shares.size() == 1 ? offset : 0;
+  Found found = SearchShares(shares, arguments.operands().front(), AsQuery(arguments), {begin, end - begin});
   std::vector<Hit>& hits = found.hits;
-  hits.erase(hits.begin() + static_cast<ptrdiff_t>(std::min(wanted, hits.size())), hits.end());
-  hits.erase(hits.begin(), hits.begin() + static_cast<ptrdiff_t>(std::min(offset, hits.size())));
+  hits.resize(std::min(end - begin, hits.size()));
+  hits.erase(hits.begin(), hits.begin() + static_cast<ptrdiff_t>(std::min(offset - begin, hits.size())));
   if (arguments.Has("--json")) {
-    for (const Hit& hit : hits) std::cout << AsJson(hit) << '\n';
+    PrintHitsAsJson(found);
   } else {
     PrintHits(found, offset);
   }

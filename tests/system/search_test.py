@@ -85,6 +85,30 @@ class SearchTest(unittest.TestCase):
         shutil.rmtree(inside / "moved")
         self.until_found(["in/photo.txt"], "beta")
 
+    def test_a_typed_line_finds_by_phrases_and_fields_and_shows_the_words(self):
+        for path, text in ("in/plan.md", "the annual report\n\x1b[31m"), ("in/deep/old.txt", "report annual"), ("in/p.mp3", "x" * 2048):
+            machine.write(DOCS / path, text)
+        os.utime(DOCS / "in/deep/old.txt", (1714564800, 1714564800))
+        os.sync()
+        self.until_found(["in/deep/old.txt"], "date:2024-05")
+        for line, expected in ('"annual report"', ["in/plan.md"]), ("annual -path:deep", ["in/plan.md"]), ("type:audio", ["in/p.mp3"]), \
+                ("name:*.mp3 size:2k", ["in/p.mp3"]), ("type:folder name:deep", ["in/deep"]), ("ext:md OR alpha", ["in/first.txt", "in/plan.md"]):
+            self.until_found(expected, line)
+        self.until_found(["in/deep/old.txt", "in/p.mp3"], "--type", "txt,audio", "NOT alpha")
+        snippet = machine.ctl("search", "plan")[1], machine.ctl("search", "report the")[1][0]["snippet"]
+        self.assertEqual(("snippet" in snippet[0][0], snippet[1]["marks"]), (False, [[0, 3], [11, 6]]))
+        refused = machine.ctl("search", 'annual "report')
+        self.assertEqual((refused[0], refused[1][0]["error"]["code"]), (1, 613))
+        self.assertEqual(machine.ctl("search", "anual report")[1], [])
+        self.assertEqual(machine.ctl("suggest", "rebuild")[0], 0)
+        self.assertEqual(machine.ctl("search", "anual report")[1], [{"did_you_mean": "annual report"}])
+        for line, shown in ('"annual report"', b"the \x1b[1mannual\x1b[0m \x1b[1mreport\x1b[0m [31m\r\n"), \
+                ('annual "report', b'  annual "report\r\n         ^\r\n'):
+            terminal, other = os.openpty()
+            subprocess.run([os.environ["FILEINDEXCTL"], "search", line], stdout=other, stderr=other)
+            self.assertIn(shown, os.read(terminal, 10000))
+            (os.close(terminal), os.close(other))
+
     def test_a_folder_list_that_changed_is_followed(self):
         (DOCS / "out.txt").write_text("alpha")
         self.folders("/docs")

@@ -19,6 +19,7 @@ enum ElasticdCode : int {
   kElasticdIndexRecovering = 608,
   kElasticdNoSuchIndex = 609,
   kElasticdIndexPaused = 610,
+  kElasticdBadQuery = 613,
   kElasticdNoRoom = 618,
   kElasticdOutOfMemory = 1400,
   kElasticdTooManyRequests = 1401
