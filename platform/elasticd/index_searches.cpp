@@ -195,7 +195,7 @@ void Index::SearchCommitted(const SearchRequest& request, Answer& answer) {
   answer.Append(result.exact ? ",\"exact\":true" : ",\"exact\":false");
   if (result.cut || parser.cut()) answer.Append(",\"cut\":true");
   if (!request.suggest || result.total >= kLittle) return;
-  const std::vector<LineWord> words = parser.line_words();
+  const std::vector<LineWord> words = parser.first_line_words();
   const auto suggestion =
       Retry(reader, places, [&] { return Suggest(reader, mapping_, parser, request.qsl, words, result.total); });
   if (!suggestion.empty()) answer.Append(",\"suggestion\":" + toString(Json::Value(suggestion)));

@@ -25,8 +25,12 @@ constexpr char kDateField[] = "VEXOMDFSContentChangeDate";
 // Each costs a look-up at least.
 constexpr size_t kMostWords = 256;
 
-// Each document that is looked at for a phrase costs some 30 us.
+// Each document that is looked at for a phrase costs some 30 us, and another look for so many bytes of its text.
 constexpr size_t kMostLooks = 50000;
+constexpr size_t kBytesOfLook = 4096;
+
+// Each looks at the names of all directories.
+constexpr size_t kMostPaths = 8;
 
 // What people call directories.
 constexpr char kFolderType[] = "folder";
@@ -236,7 +240,10 @@ Query LineQuery::InOrder(const std::vector<TextPiece>& pieces) const {
     if (*left == 0) return false;
     --*left;
     bool stands = false;
-    ForEachText(store_, mapping_, id, [&](std::string_view text) { return !(stands = phrase->StandsIn(text)); });
+    ForEachText(store_, mapping_, id, [&](std::string_view text) {
+      *left -= std::min(*left, text.size() / kBytesOfLook);
+      return !(stands = phrase->StandsIn(text));
+    });
     return stands;
   };
   parts.push_back(std::move(check));
@@ -318,7 +325,8 @@ Query LineQuery::ByDate(const LineNode& node) const {
   return InNumbers(kDateField, bounds->low, bounds->high);
 }
 
-Query LineQuery::ByPath(const LineNode& node) const {
+Query LineQuery::ByPath(const LineNode& node) {
+  if (++paths_ > kMostPaths) FailAt(line_, node.begin, "over " + std::to_string(kMostPaths) + " paths");
   const bool from_root = node.text.starts_with('/');
   const std::vector<NamePattern> patterns = ComponentPatterns(node);
   if (patterns.empty()) return from_root ? Query{Query::kEverything} : Query{Query::kNothing};
@@ -340,13 +348,15 @@ void LineQuery::Refuse(const LineNode& node, const char* wanted) const {
   FailAt(line_, node.begin, "\"" + Shown(node.text) + "\" is no " + wanted);
 }
 
-Query LineQuery::ByField(const LineNode& node) const {
+Query LineQuery::ByField(const LineNode& node) {
   switch (node.field) {
     case SearchField::kName:
       return ByName(node);
     case SearchField::kExtension: {
       std::vector<std::string> extensions = SplitList(ToLower(node.text), ',');
       for (std::string& extension : extensions) extension.erase(0, extension.starts_with('.') ? 1 : 0);
+      if (extensions.size() > 1) std::erase(extensions, "");  // behind a comma, where a blank followed it
+      if (extensions.empty()) Refuse(node, "list of extensions; write ext:pdf,docx");
       return ByExtensions(extensions);
     }
     case SearchField::kType:

@@ -63,8 +63,8 @@ class LineQuery {
   Query ByType(const LineNode& node) const;
   Query BySize(const LineNode& node) const;
   Query ByDate(const LineNode& node) const;
-  Query ByPath(const LineNode& node) const;
-  Query ByField(const LineNode& node) const;
+  Query ByPath(const LineNode& node);
+  Query ByField(const LineNode& node);
   Query InNumbers(const char* field, double low, double high) const;
   [[noreturn]] void Refuse(const LineNode& node, const char* wanted) const;
 
@@ -76,6 +76,7 @@ class LineQuery {
   std::string_view line_;
   std::vector<LineWord> words_;
   size_t word_count_ = 0;         // with those that must not be there
+  size_t paths_ = 0;              // conditions on paths
   std::shared_ptr<size_t> left_;  // so many documents may yet be looked at
 };
 

@@ -103,6 +103,7 @@ Query InDirectories(std::unordered_set<DirectoryId> directories, std::string_vie
 Query QueryParser::Parse(const Json::Value& qsl) {
   lines_.clear();
   line_words_.clear();
+  first_line_words_.clear();
   return ParseAt(qsl, 0);
 }
 
@@ -275,6 +276,7 @@ Query QueryParser::Line(const Json::Value& value) {
   LineQuery& made = lines_.emplace_back(mapping_, store_, places_, std::move(settings));
   Query query = made.Make(line);
   line_words_.insert(line_words_.end(), made.words().begin(), made.words().end());
+  if (lines_.size() == 1) first_line_words_ = line_words_;
   return query;
 }
 

@@ -36,6 +36,7 @@ class QueryParser {
 
   // What the typed lines of the last query look for in texts.
   const std::vector<LineWord>& line_words() const { return line_words_; }
+  const std::vector<LineWord>& first_line_words() const { return first_line_words_; }
 
   // Whether a search for that query left out documents because it had looked at too many.
   bool cut() const;
@@ -58,6 +59,7 @@ class QueryParser {
   const Places& places_;
   std::deque<LineQuery> lines_;  // of the last query, which refers to them
   std::vector<LineWord> line_words_;
+  std::vector<LineWord> first_line_words_;
 };
 
 // A query that asks for one document, or for all that begin with a path, and nothing else: {"term"} or {"prefix"} of

@@ -85,8 +85,13 @@ class Copy {
 void SnippetWords::Add(const TextPiece& piece, bool beginning) {
   const std::string& word = piece.text;
   if (beginning && !piece.ideographs) {
+    if (std::find(beginnings_.begin(), beginnings_.end(), word) != beginnings_.end()) return;
     beginnings_.push_back(word);
   } else {
+    const auto is_same = [&](const TextPiece& other) {
+      return other.text == word && other.ideographs == piece.ideographs;
+    };
+    if (std::any_of(words_.begin(), words_.end(), is_same)) return;
     words_.push_back(piece);
   }
   const auto first = static_cast<unsigned char>(word.front());
@@ -116,7 +121,9 @@ void SnippetWords::TakeSigns(std::string_view text, size_t begin, size_t end, st
   for (size_t i = 0; i < words_.size(); ++i) {
     if (!words_[i].ideographs) continue;
     const std::string& word = words_[i].text;
-    for (size_t at = folded.find(word); at != std::string::npos; at = folded.find(word, at + word.size())) {
+    size_t left = kMostFound;
+    for (size_t at = folded.find(word); at != std::string::npos && left-- > 0;
+         at = folded.find(word, at + word.size())) {
       const size_t last = places[at + word.size() - 1];
       found.push_back({places[at], last + DecodeAt(text, last).length, i});
     }

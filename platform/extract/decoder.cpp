@@ -22,8 +22,11 @@ struct Alias {
   std::string_view declared;
   const char* meant;
 };
-constexpr Alias kAliases[] = {
-    {"gb2312", "gb18030"}, {"gbk", "gb18030"}, {"iso-8859-1", "windows-1252"}, {"us-ascii", "windows-1252"}};
+constexpr Alias kAliases[] = {{"gb2312", "gb18030"},
+                              {"gbk", "gb18030"},
+                              {"iso-8859-1", "windows-1252"},
+                              {"us-ascii", "windows-1252"},
+                              {"uhc", "windows-949"}};
 
 std::string Meant(const std::string& encoding) {
   std::string name = quarrox::ToLower(encoding);
@@ -37,18 +40,21 @@ bool IsOfName(char c) {
   return isalnum(static_cast<unsigned char>(c)) != 0 || c == '-' || c == '_' || c == ':' || c == '.';
 }
 
-std::string Declared(std::string_view head) {
+// The first encoding that is named; of something else, perhaps, where it cannot be UTF-8 and that is what is named.
+std::string Declared(std::string_view head, bool may_be_utf8) {
   const std::string text = quarrox::ToLower(std::string(head.substr(0, kDeclarationWithin)));
   for (const std::string_view key : {"charset", "encoding"}) {
-    size_t at = text.find(key);
-    if (at == std::string::npos) continue;
-    at = text.find_first_not_of(" \t\r\n", at + key.size());
-    if (at == std::string::npos || text[at] != '=') continue;
-    at = text.find_first_not_of(" \t\r\n\"'", at + 1);
-    if (at == std::string::npos) continue;
-    const auto start = text.begin() + static_cast<std::ptrdiff_t>(at);
-    std::string name(start, std::find_if_not(start, text.end(), IsOfName));
-    return name.starts_with("utf-16") ? "utf-8" : name;  // it could not be read if it were true
+    for (size_t at = text.find(key); at != std::string::npos; at = text.find(key, at)) {
+      at = text.find_first_not_of(" \t\r\n", at + key.size());
+      if (at == std::string::npos) break;
+      if (text[at] != '=') continue;
+      at = text.find_first_not_of(" \t\r\n\"'", at + 1);
+      if (at == std::string::npos) break;
+      const auto start = text.begin() + static_cast<std::ptrdiff_t>(at);
+      std::string name(start, std::find_if_not(start, text.end(), IsOfName));
+      if (name.starts_with("utf-16")) name = "utf-8";  // it could not be read if it were true
+      if (!name.empty() && (may_be_utf8 || name != "utf-8")) return name;
+    }
   }
   return {};
 }
@@ -81,9 +87,11 @@ std::string GuessEncoding(std::string_view head) {
   const char* const mark =
       ucnv_detectUnicodeSignature(head.data(), static_cast<int32_t>(head.size()), nullptr, &status);
   if (mark != nullptr) return mark;
-  std::string declared = Declared(head);
+  const bool is_ascii = std::none_of(head.begin(), head.end(), [](char c) { return static_cast<signed char>(c) < 0; });
+  if (!is_ascii && IsUtf8(head)) return "utf-8";  // whatever is declared somewhere
+  const std::string declared = Declared(head, is_ascii);
   if (!declared.empty()) return declared;
-  return IsUtf8(head) ? "utf-8" : Detected(head);
+  return is_ascii ? "utf-8" : Detected(head);
 }
 
 Decoder::Decoder(const std::string& encoding) {

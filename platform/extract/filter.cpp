@@ -24,6 +24,9 @@ constexpr uint64_t kLongestCopy = uint64_t{128} << 20;
 // What a damaged file may make a program do for ever. In seconds of the processor's time.
 constexpr rlim_t kTimeLimit = 5;
 
+// How the new process ends that could not become the program.
+constexpr int kCannotRun = 127;
+
 [[noreturn]] void Throw(const char* what) {
   throw std::system_error(errno, std::generic_category(), what);
 }
@@ -45,14 +48,14 @@ UniqueFd Copy(const Source& source) {
 [[noreturn]] void Execute(int input, int output, char* const* command) {
   static char locale[] = "LC_ALL=C.UTF-8";
   static char* const environment[] = {locale, nullptr};
-  const rlimit limit = {kTimeLimit, kTimeLimit};
+  const rlimit limit = {kTimeLimit, RLIM_INFINITY};  // past it comes SIGXCPU, which is told from SIGKILL
   prctl(PR_SET_PDEATHSIG, SIGKILL);
   setrlimit(RLIMIT_CPU, &limit);
   // Writing to what is open for reading fails, so errors go nowhere.
   if (dup2(input, STDIN_FILENO) >= 0 && dup2(output, STDOUT_FILENO) >= 0 && dup2(input, STDERR_FILENO) >= 0) {
     execve(command[0], command, environment);
   }
-  _exit(127);
+  _exit(kCannotRun);
 }
 
 }  // namespace
@@ -78,6 +81,18 @@ Filter::~Filter() {
   Wait();
 }
 
+// What says nothing about the file may pass: no such program, no memory.
+void Filter::CheckEnd(int status) const {
+  if (status == 0) return;
+  if (WIFEXITED(status) && WEXITSTATUS(status) == kCannotRun) {
+    throw std::system_error(ENOENT, std::generic_category(), program_ + " cannot be run");
+  }
+  if (WIFSIGNALED(status) && WTERMSIG(status) == SIGKILL) {
+    throw std::system_error(EAGAIN, std::generic_category(), program_ + " was killed");
+  }
+  throw std::runtime_error(program_ + " failed");
+}
+
 int Filter::Wait() {
   int status = -1;
   if (pid_ > 0) {
@@ -94,7 +109,7 @@ std::string_view Filter::Piece() {
     n = read(output_.get(), buffer_.data(), buffer_.size());
   } while (n < 0 && errno == EINTR);
   if (n < 0) Throw("read");
-  if (n == 0 && pid_ > 0 && Wait() != 0) throw std::runtime_error(program_ + " failed");
+  if (n == 0 && pid_ > 0) CheckEnd(Wait());
   return {buffer_.data(), static_cast<size_t>(n)};
 }
 

@@ -30,6 +30,7 @@ class Filter {
   std::string_view Piece();
 
  private:
+  void CheckEnd(int status) const;
   int Wait();  // its status
 
   std::string program_;

@@ -18,7 +18,8 @@ constexpr auto kInline =
     std::to_array<std::string_view>({"a",    "abbr",   "acronym", "b",   "bdi", "bdo",  "big", "cite", "code", "dfn",
                                      "em",   "font",   "i",       "ins", "kbd", "mark", "q",   "s",    "samp", "small",
                                      "span", "strike", "strong",  "sub", "sup", "tt",   "u",   "var",  "wbr"});
-constexpr auto kUnseen = std::to_array<std::string_view>({"head", "script", "style", "template"});
+// Not the whole head: what follows it without a tag that ends it may be taken for its part.
+constexpr auto kUnseen = std::to_array<std::string_view>({"title", "script", "style", "template"});
 constexpr TextRules kHtmlText = {.read = {}, .skipped = kUnseen, .breaks = kInline, .others_break = true};
 
 constexpr auto kHeadFields = std::to_array<FieldRule>({

@@ -110,7 +110,10 @@ bool IsEncrypted(const OleFile& file) {
 void ExtractOldOffice(const Source& source, Findings& findings) {
   const Mapping mapping(source);
   const OleFile file(mapping.bytes());
-  SetProperties(file.Read("\5SummaryInformation", kLongestSummary), findings);
+  try {
+    SetProperties(file.Read("\5SummaryInformation", kLongestSummary), findings);
+  } catch (const std::runtime_error&) {  // the text may be whole
+  }
   if (IsEncrypted(file)) return findings.Set("VEXOMDIsEncrypted", true);
   for (const Reader& reader : kReaders) {
     if (!file.Has(reader.stream)) continue;

@@ -28,6 +28,10 @@ constexpr Support kFormats[] = {
 
 [[noreturn]] void Throw(archive* packed) {
   const char* const reason = archive_error_string(packed);
+  const int error = archive_errno(packed);
+  if (error == EIO || error == ESTALE || error == ETIMEDOUT) {
+    throw std::system_error(error, std::generic_category(), "read");
+  }
   throw std::runtime_error(reason == nullptr ? "damaged archive" : reason);
 }
 

@@ -84,7 +84,7 @@ void SetNumber(const char* field, const Exiv2::Value& value, Findings& findings)
 }
 
 void SetRating(const char* /*field*/, const Exiv2::Value& value, Findings& findings) {
-  SetStars(value.toFloat(), findings);
+  if (value.count() > 0) SetStars(value.toFloat(), findings);
 }
 
 // 0 where there is no such number.

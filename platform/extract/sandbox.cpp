@@ -24,7 +24,7 @@ constexpr size_t kMostSpace = size_t{768} << 20;
 constexpr rlim_t kMostWritten = rlim_t{128} << 20;
 
 // Descriptors, the filters' pipes among them.
-constexpr rlim_t kMostFiles = 64;
+constexpr rlim_t kMostFiles = 24;
 
 // The user and group with the fewest rights, the same numbers on every machine.
 constexpr unsigned int kNobody = 65534;

@@ -28,8 +28,8 @@ constexpr const char* kAllowed[] = {
     // threads, and programs that are started
     "futex", "futex_time64", "set_robust_list", "get_robust_list", "rseq", "set_tid_address", "arch_prctl",
     "set_thread_area", "fork", "vfork", "execve", "exit", "exit_group", "wait4", "waitid", "waitpid", "getpid",
-    "gettid", "getppid", "getpgrp", "getpgid", "getsid", "setsid", "setpgid", "getuid", "geteuid", "getgid", "getegid",
-    "getgroups", "getresuid", "getresgid", "getuid32", "geteuid32", "getgid32", "getegid32", "prctl", "kill", "tgkill",
+    "gettid", "getppid", "getpgrp", "getpgid", "getsid", "getuid", "geteuid", "getgid", "getegid", "getgroups",
+    "getresuid", "getresgid", "getuid32", "geteuid32", "getgid32", "getegid32", "prctl", "kill", "tgkill",
     "sched_yield", "sched_getaffinity", "sched_getparam", "sched_getscheduler", "getpriority", "getrlimit",
     "ugetrlimit", "setrlimit", "getrusage", "sysinfo", "uname", "getcpu",
     // signals

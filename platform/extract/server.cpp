@@ -29,8 +29,7 @@ namespace {
 // not see: filters that are left. In seconds.
 constexpr unsigned int kTimeForFile = 30;
 
-// A process that read so many files, or that holds so much memory (in bytes), has earned its rest: libraries leak.
-constexpr int kMostFiles = 10000;
+// A process that holds so much memory, in bytes, has earned its rest: libraries leak.
 constexpr size_t kMostResident = size_t{256} << 20;
 
 constexpr const char* kText = "VEXOMDTextContent";
@@ -83,9 +82,11 @@ bool Send(int socket, wire::Answer answer, const std::string& words, const std::
   return true;
 }
 
-// Whether an error is the disk's, or of another machine that lends it.
-bool IsOfDisk(const std::error_code& code) {
-  constexpr int kErrors[] = {EIO, ESTALE, ETIMEDOUT, EHOSTUNREACH, ENOTCONN, ECONNRESET, EREMOTEIO};
+// Whether an error is the disk's, or of another machine that lends it, or of this one where it is short of processes,
+// or of a program that is not there.
+bool MayPass(const std::error_code& code) {
+  constexpr int kErrors[] = {EIO,        ESTALE, ETIMEDOUT, EHOSTUNREACH, ENOTCONN,
+                             ECONNRESET, ENOENT, EAGAIN,    EMFILE,       ENFILE};
   return code.category() == std::generic_category() &&
          std::find(std::begin(kErrors), std::end(kErrors), code.value()) != std::end(kErrors);
 }
@@ -95,15 +96,15 @@ struct Failure {
   int error = 0;      // where it may pass
 };
 
-Failure Extract(Extractor extract, const Source& source, Findings& findings) {
+template <typename Work>
+Failure Extract(const Work& work) {
   try {
-    ReadExtendedAttributes(source, findings);
-    extract(source, findings);
+    work();
     return {};
   } catch (const std::bad_alloc&) {
     return {"reading the file takes too much memory"};
   } catch (const std::system_error& error) {
-    return {error.what(), IsOfDisk(error.code()) ? error.code().value() : 0};
+    return {error.what(), MayPass(error.code()) ? error.code().value() : 0};
   } catch (const std::exception& error) {
     return {std::string("the file is damaged: ") + error.what()};
   } catch (...) {
@@ -114,15 +115,19 @@ Failure Extract(Extractor extract, const Source& source, Findings& findings) {
 // What was found in a damaged file is kept; a disk that fails is another matter.
 bool Answer(int socket, Extractor extract, const Source& source, bool is_last) {
   Findings findings;
-  Failure failure = Extract(extract, source, findings);
+  Failure failure = Extract([&] {
+    ReadExtendedAttributes(source, findings);
+    extract(source, findings);
+  });
   Json::Value found = findings.Take();
   const bool is_damaged = failure.error == 0 && !failure.words.empty() && found.empty();
   const bool is_text = source.type.starts_with("text/") || source.type == "message/rfc822";
   if (is_damaged && is_text) {  // what is no XML, or no mail, may still be text
-    failure = Extract(ReadText, source, findings);
+    failure = Extract([&] { ReadText(source, findings); });
     found = findings.Take();
   }
-  const bool failed = failure.error != 0 || (!failure.words.empty() && found.empty());
+  const bool is_guess = source.type == "application/octet-stream";  // by its name alone, which many others bear
+  const bool failed = failure.error != 0 || (!failure.words.empty() && found.empty() && !is_guess);
   wire::Answer answer;
   answer.kind = failed ? wire::kFailed : wire::kFound;
   answer.error = failure.error;
@@ -158,7 +163,7 @@ void EndWith(int parent) {
   }).detach();
 }
 
-void Serve(int socket, const Json::Value& features, const Ways& ways) {
+void Serve(int socket, const Json::Value& features, const Ways& ways, int most_files) {
   wire::Answer ready;
   ready.error = wire::kVersion;
   if (!Send(socket, ready, quarrox::toString(features))) return;
@@ -168,12 +173,19 @@ void Serve(int socket, const Json::Value& features, const Ways& ways) {
     if (!ReceiveRequest(socket, &request, &file)) return;
     LimitTime(kTimeForFile);
     Source source{file.get(), request.size, {}, request.extension};
-    source.type = ways.type_of(source);
+    const Failure failure = Extract([&] { source.type = ways.type_of(source); });
+    if (!failure.words.empty()) {
+      wire::Answer failed;
+      failed.kind = wire::kFailed;
+      failed.error = failure.error;
+      if (!Send(socket, failed, failure.words)) return;
+      continue;
+    }
     const Extractor extract = ways.extractor_of(source.type);
     wire::Answer type;
     type.kind = wire::kType;
     if (extract != ReadText && !Send(socket, type, source.type)) return;
-    if (!Answer(socket, extract, source, count == kMostFiles)) return;
+    if (!Answer(socket, extract, source, count == most_files)) return;
   }
 }
 

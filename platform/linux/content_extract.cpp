@@ -12,6 +12,7 @@
 #include <string_view>
 #include <system_error>
 
+#include "common/file.h"
 #include "common/strings.h"
 #include "common/unique_fd.h"
 #include "linux/content_extract_text.h"
@@ -28,7 +29,8 @@ struct statx Look(const std::string& path) {
   }
   struct statx info;
   constexpr unsigned int kWanted = STATX_BASIC_STATS | STATX_BTIME;
-  if (statx(AT_FDCWD, path.c_str(), AT_SYMLINK_NOFOLLOW | AT_NO_AUTOMOUNT, kWanted, &info) != 0) {
+  const quarrox::UniqueFd fd(quarrox::OpenWithoutLinks(path, O_PATH));
+  if (!fd || statx(fd.get(), "", AT_EMPTY_PATH | AT_NO_AUTOMOUNT, kWanted, &info) != 0) {
     throw std::system_error(errno, std::generic_category());
   }
   return info;
@@ -78,9 +80,9 @@ bool NeedsContent(const Json::Value& options) {
 
 // Reading for the index is no use of the file, so its access time stays; only the owner and root may ask for that.
 int OpenUnnoticed(const std::string& path) {
-  constexpr int kFlags = O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC;
-  const int fd = open(path.c_str(), kFlags | O_NOATIME);
-  return fd < 0 && errno == EPERM ? open(path.c_str(), kFlags) : fd;
+  constexpr int kFlags = O_RDONLY | O_NONBLOCK | O_NOCTTY;
+  const int fd = quarrox::OpenWithoutLinks(path, kFlags | O_NOATIME);
+  return fd < 0 && errno == EPERM ? quarrox::OpenWithoutLinks(path, kFlags) : fd;
 }
 
 // What cannot be opened as it is, whoever tries again: not readable, a symbolic link, a socket, a device that is not

@@ -240,11 +240,14 @@ ContentWorker::Outcome ContentWorker::ReceiveAll(void* buffer, size_t size) {
 void ContentWorker::ReceivePart(void* buffer, size_t size) {
   const Outcome outcome = ReceiveAll(buffer, size);
   if (outcome == kDone) return;
+  const bool has_worked = ProcessorTime() - used_at_start_ >= time_ / 10;
   const int status = End();
   const std::string of_type = type_.empty() ? "" : " (" + type_ + ")";
   if (outcome == kLate) {
     const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(time_).count();
-    throw std::runtime_error("reading the file took longer than " + std::to_string(seconds) + " s" + of_type);
+    const std::string what = "reading the file took longer than " + std::to_string(seconds) + " s" + of_type;
+    if (has_worked) throw std::runtime_error(what);
+    throw std::system_error(ETIMEDOUT, std::generic_category(), what);  // it waited, for a disk perhaps
   }
   const std::string what = "the file's reader " + Describe(status) + of_type;
   const int passing = WIFSIGNALED(status) ? PassingError(WTERMSIG(status)) : 0;

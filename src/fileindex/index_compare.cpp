@@ -12,6 +12,7 @@
 
 #include "common/comm.h"
 #include "common/error.h"
+#include "common/file.h"
 #include "common/json.h"
 #include "common/log.h"
 #include "common/strings.h"
@@ -70,9 +71,9 @@ struct CloseDirectory {
 };
 using OpenDirectory = std::unique_ptr<DIR, CloseDirectory>;
 
-// Null and errno where it cannot be opened. A link in its place is not followed.
+// Null and errno where it cannot be opened. A link in its place or above is not followed.
 OpenDirectory Open(const std::string& path) {
-  const int fd = open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC);
+  const int fd = OpenWithoutLinks(path, O_RDONLY | O_DIRECTORY | O_NONBLOCK);
   return OpenDirectory(fd < 0 ? nullptr : fdopendir(fd));
 }
 

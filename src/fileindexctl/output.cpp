@@ -4,6 +4,7 @@
 #include <cstdio>
 #include <ctime>
 #include <ostream>
+#include <string_view>
 
 #include "fileindex/status_mgr.h"
 
@@ -16,16 +17,34 @@ size_t Width(const std::string& text) {
       std::count_if(text.begin(), text.end(), [](char c) { return (static_cast<unsigned char>(c) & 0xc0) != 0x80; }));
 }
 
+// How many bytes at the beginning of a text are a character that a terminal obeys: controls, in UTF-8 those of C1 too,
+// and what turns the direction of writing.
+size_t HarmfulAt(std::string_view text) {
+  const auto byte = [&](size_t i) { return i < text.size() ? static_cast<unsigned char>(text[i]) : 0U; };
+  const auto is_from = [&](size_t i, unsigned int first, unsigned int last) {
+    return first <= byte(i) && byte(i) <= last;
+  };
+  if (byte(0) < 0x20 || byte(0) == 0x7f) return 1;
+  if (byte(0) == 0xc2 && is_from(1, 0x80, 0x9f)) return 2;
+  const bool is_turn = (byte(1) == 0x80 && is_from(2, 0xaa, 0xae)) || (byte(1) == 0x81 && is_from(2, 0xa6, 0xa9));
+  return byte(0) == 0xe2 && is_turn ? 3 : 0;
+}
+
 }  // namespace
 
 std::string Visible(const std::string& text) {
   static constexpr char kHex[] = "0123456789abcdef";
   std::string result;
-  for (const char c : text) {
+  size_t escaped = 0;  // bytes that are still to be
+  for (size_t i = 0; i < text.size(); ++i) {
+    const char c = text[i];
     const auto byte = static_cast<unsigned char>(c);
+    if (escaped == 0) escaped = HarmfulAt(std::string_view(text).substr(i));
     if (c == '\n') {
       result += "\\n";
-    } else if (byte < 0x20 || byte == 0x7f) {
+      escaped = 0;
+    } else if (escaped > 0) {
+      --escaped;
       result.append("\\x").append(1, kHex[byte >> 4]).append(1, kHex[byte & 15]);
     } else {
       result += c;

@@ -101,7 +101,7 @@ std::string ForNames(const std::string& text) {
 std::string ForTypes(const std::string& list) {
   std::string line;
   for (const std::string& type : Split(list, ",")) {
-    line += (line.empty() ? "" : " OR ") + std::string(IsType(type) ? "type:" : "ext:") + Quoted(type);
+    line += (line.empty() ? "" : " OR ") + std::string(IsType(ToLower(type)) ? "type:" : "ext:") + Quoted(type);
   }
   return line;
 }
@@ -137,18 +137,18 @@ Hit AsHit(const std::string& share, const Json::Value& fields) {
   return hit;
 }
 
-// What cannot be read is shown below the line on a terminal.
+// What cannot be read is shown below the line on a terminal, where a person typed it.
 [[noreturn]] void RefuseLine(const std::string& line, const std::string& message) {
   constexpr std::string_view kBeforeColumn = "column ";
   const size_t at = message.find(kBeforeColumn);
   const std::string reason = at == std::string::npos ? message : message.substr(at);
-  if (at != std::string::npos && isatty(STDERR_FILENO) == 1) {
+  if (at != std::string::npos && !line.empty() && isatty(STDERR_FILENO) == 1) {
     const auto column = strtoull(reason.c_str() + kBeforeColumn.size(), nullptr, 10);
     if (column > 0 && column < kWidest) {
       std::cerr << "  " << Visible(line) << "\n  " << std::string(column - 1, ' ') << "^\n";
     }
   }
-  throw Error(ErrorCode{kElasticdBadQuery}, reason);
+  throw Error(static_cast<ErrorCode>(int{kElasticdBadQuery}), reason);
 }
 
 void SearchShare(const std::string& share, const Json::Value& qsl, Page page, Found& found) {
@@ -218,7 +218,9 @@ int Search(const Arguments& arguments) {
 
   // The best of several shares are known when the best of each are.
   const size_t begin = shares.size() == 1 ? offset : 0;
-  Found found = SearchShares(shares, arguments.operands().front(), AsQuery(arguments), {begin, end - begin});
+  const bool is_as_typed = !arguments.Has("--name") && !arguments.Has("--type");
+  const std::string line = is_as_typed ? arguments.operands().front() : std::string();
+  Found found = SearchShares(shares, line, AsQuery(arguments), {begin, end - begin});
   std::vector<Hit>& hits = found.hits;
   hits.resize(std::min(end - begin, hits.size()));
   hits.erase(hits.begin(), hits.begin() + static_cast<ptrdiff_t>(std::min(offset - begin, hits.size())));

@@ -256,9 +256,10 @@ void IndexHandler::FollowFolders() {
     if (rebuilt_) return;
     const std::string path = scope_.directory() + difference.path;
     if (difference.unseen_since) {
-      recent_ = std::min(recent_, *difference.unseen_since);
+      const int64_t recent = std::exchange(recent_, std::min(recent_, *difference.unseen_since));
       compared_.clear();
       WithIndex([&] { Reindex(path, difference.kinds); });
+      recent_ = recent;
     } else {
       WithIndex([&] { Compare(path, difference.kinds); });
     }

@@ -93,6 +93,6 @@ int main() {
   const int parent = OpenParent();
   const Json::Value features = EnterSandbox();
   EndWith(parent);
-  Serve(STDIN_FILENO, features, {TypeOf, ExtractorOf});
+  Serve(STDIN_FILENO, features, {TypeOf, ExtractorOf}, 100);
   _exit(0);
 }

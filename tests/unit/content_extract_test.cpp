@@ -63,6 +63,9 @@ TEST(ContentExtract, DescribesWhateverAPathNamesAndReadsText) {
     EXPECT_EQ(parse(name, " <no tag\n")["VEXOMDTextContent"].asString().substr(0, 8), " <no tag") << name;
   }
   EXPECT_EQ(VEXO::CONTENT_EXTRACT::LastFailure(), "");
+  EXPECT_TRUE(mkdir((dir / "real").c_str(), 0700) == 0 && symlink("real", (dir / "alias").c_str()) == 0);
+  WriteText(dir / "real/f", "text");
+  EXPECT_THROW(parse("alias/f", ""), std::system_error);  // who may make links is not followed elsewhere
   EXPECT_THROW(parse("missing", ""), std::system_error);
   EXPECT_EQ(VEXO::CONTENT_EXTRACT::LastFailure(), "No such file or directory");
   EXPECT_THROW(parse("f/below", ""), std::system_error);
