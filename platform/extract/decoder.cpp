@@ -59,6 +59,10 @@ std::string Declared(std::string_view head, bool may_be_utf8) {
   return {};
 }
 
+bool IsAscii(std::string_view text) {
+  return std::none_of(text.begin(), text.end(), [](char c) { return static_cast<signed char>(c) < 0; });
+}
+
 // The last character may be cut.
 bool IsUtf8(std::string_view text) {
   const auto size = static_cast<int32_t>(text.size());
@@ -87,20 +91,30 @@ std::string GuessEncoding(std::string_view head) {
   const char* const mark =
       ucnv_detectUnicodeSignature(head.data(), static_cast<int32_t>(head.size()), nullptr, &status);
   if (mark != nullptr) return mark;
-  const bool is_ascii = std::none_of(head.begin(), head.end(), [](char c) { return static_cast<signed char>(c) < 0; });
+  const bool is_ascii = IsAscii(head);
   if (!is_ascii && IsUtf8(head)) return "utf-8";  // whatever is declared somewhere
-  const std::string declared = Declared(head, is_ascii);
+  std::string declared = Declared(head, is_ascii);
   if (!declared.empty()) return declared;
   return is_ascii ? "utf-8" : Detected(head);
 }
 
 Decoder::Decoder(const std::string& encoding) {
+  constexpr std::string_view kLikeAscii[] = {"utf-8", "windows-125", "iso-8859-", "koi8-", "gb18030", "euc-", "big5"};
+  const std::string meant = Meant(encoding);
+  is_like_ascii_ = std::any_of(std::begin(kLikeAscii), std::end(kLikeAscii),
+                               [&](std::string_view like) { return meant.starts_with(like); });
   UErrorCode status = U_ZERO_ERROR;
-  converter_ = encoding.empty() ? nullptr : ucnv_open(Meant(encoding).c_str(), &status);
+  converter_ = encoding.empty() ? nullptr : ucnv_open(meant.c_str(), &status);
   if (converter_ != nullptr) return;
   status = U_ZERO_ERROR;
   converter_ = ucnv_open("windows-1252", &status);
   if (converter_ == nullptr) throw std::bad_alloc();
+}
+
+// Whether the last piece ended inside a character.
+bool Decoder::IsInside() const {
+  UErrorCode status = U_ZERO_ERROR;
+  return ucnv_toUCountPending(converter_, &status) != 0 || U_FAILURE(status);
 }
 
 Decoder::~Decoder() {
@@ -108,6 +122,11 @@ Decoder::~Decoder() {
 }
 
 std::string Decoder::Decode(std::string_view piece) {
+  // Most of what is read is: converting it would cost as much as parsing it.
+  if (is_like_ascii_ && IsAscii(piece) && !IsInside()) {
+    begun_ = begun_ || !piece.empty();
+    return std::string(piece);
+  }
   // No encoding has more units of UTF-16 for its bytes than this, with what is left of the piece before.
   std::vector<UChar> units(2 * piece.size() + 64);
   UChar* to = units.data();

@@ -27,7 +27,10 @@ class Decoder {
   std::string Decode(std::string_view piece);
 
  private:
+  bool IsInside() const;
+
   UConverter* converter_;
+  bool is_like_ascii_;  // what is ASCII is the same in it
   bool begun_ = false;
 };
 

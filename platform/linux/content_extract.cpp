@@ -12,7 +12,7 @@
 #include <string_view>
 #include <system_error>
 
-#include "common/file.h"
+#include "common/open_file.h"
 #include "common/strings.h"
 #include "common/unique_fd.h"
 #include "linux/content_extract_text.h"

@@ -12,9 +12,9 @@
 
 #include "common/comm.h"
 #include "common/error.h"
-#include "common/file.h"
 #include "common/json.h"
 #include "common/log.h"
+#include "common/open_file.h"
 #include "common/strings.h"
 #include "fileindex/elastic_control.h"
 #include "fileindex/index_rows.h"

@@ -43,6 +43,8 @@ constexpr size_t kProcessors = 2;
 constexpr double kBusyProcessors = 0.75;
 
 constexpr milliseconds kBetweenLooks(1000);
+constexpr milliseconds kStale(10000);    // what was before an idle while says nothing about now
+constexpr milliseconds kFirstLook(300);  // behind it; a short pass is over by then
 constexpr milliseconds kListening(100);
 constexpr milliseconds kAfterOwnLoad(5000);  // what waits is our own doing: listening costs a fiftieth of the time
 constexpr milliseconds kRest(900);
@@ -120,6 +122,11 @@ void Pacer::Pace(int wake_fd) {
   Look(seen);
   look_at_ = now + kBetweenLooks;
   turn_ = 0;
+  if (now - last_.at > kStale) {
+    last_ = seen;
+    look_at_ = now + kFirstLook;
+    return;
+  }
   if (IsStalled(last_, seen, false)) {
     Rest(wake_fd, now + kListening);
     Sample heard = seen;

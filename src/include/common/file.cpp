@@ -1,9 +1,6 @@
 #include "common/file.h"
 
-#include <fcntl.h>
-#include <linux/openat2.h>
 #include <sys/stat.h>
-#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -37,15 +34,6 @@ bool MVFileImpl(const std::string& from, const std::string& to, int mode) {
 bool IsFileExist(const std::string& path) {
   struct stat info;
   return 0 == stat(path.c_str(), &info);
-}
-
-int OpenWithoutLinks(const std::string& path, int flags) {
-  flags |= O_NOFOLLOW | O_CLOEXEC;
-  open_how how = {};
-  how.flags = static_cast<uint64_t>(flags);
-  how.resolve = RESOLVE_NO_SYMLINKS;
-  const long fd = syscall(SYS_openat2, AT_FDCWD, path.c_str(), &how, sizeof(how));
-  return fd < 0 && errno == ENOSYS ? open(path.c_str(), flags) : static_cast<int>(fd);
 }
 
 bool IsDirExist(const std::string& path, bool follow_link) {

@@ -16,11 +16,6 @@ QUARROX_API bool IsFileExist(const std::string& path);
 // one from the process's current directory, not from the link's. This is wanted: callers know it so.
 QUARROX_API bool IsDirExist(const std::string& path, bool follow_link);
 
-// As open(2), close-on-exec, with O_NOFOLLOW; a symbolic link on the way to the last component is refused with ELOOP as
-// well, so that nobody who may write there leads the caller to another place. Where the kernel cannot do that (before
-// Linux 5.6), only the last one is looked at.
-QUARROX_API int OpenWithoutLinks(const std::string& path, int flags);
-
 // Whether an entry read from `dir` is a directory; asks the file system only where the entry does not say. A symbolic
 // link is none.
 QUARROX_API bool IsDirentDir(const dirent& entry, const std::string& dir);
