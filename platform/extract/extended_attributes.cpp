@@ -3,9 +3,11 @@
 #include <sys/xattr.h>
 
 #include <algorithm>
+#include <charconv>
 #include <cstdlib>
 #include <string>
 #include <string_view>
+#include <system_error>
 
 #include "extract/media_values.h"
 
@@ -61,6 +63,27 @@ void SetFinderLabel(const Source& source, Findings& findings) {
     SetLabel(std::string_view(stream).substr(std::min(stream.size(), kStreamHeader)), findings);
 }
 
+// Seconds since the epoch, or a date as people write it.
+void SetTime(const char* field, const std::string& text, Findings& findings) {
+  int64_t seconds = 0;
+  const char* const end = text.data() + text.size();
+  if (const auto read = std::from_chars(text.data(), end, seconds); read.ec == std::errc() && read.ptr == end) {
+    findings.Set(field, seconds);
+  } else {
+    SetDate(field, text, findings);
+  }
+}
+
+// Fields that nothing on a Linux machine has a place for. Whoever brings files from elsewhere can note them so.
+struct Noted {
+  const char* attribute;
+  Setter set;
+};
+constexpr Noted kNoted[] = {{"user.VEXOMDDateAdded", SetTime},
+                            {"user.VEXOMDFinderOpenDate", SetTime},
+                            {"user.VEXOMDGroupId", SetText},
+                            {"user.VEXOMDSpotlightBoost", SetText}};
+
 }  // namespace
 
 void ReadExtendedAttributes(const Source& source, Findings& findings) {
@@ -70,6 +93,8 @@ void ReadExtendedAttributes(const Source& source, Findings& findings) {
   findings.Set("VEXOMDComment", Attribute(source, "user.xdg.comment"));
   SetStars(strtod(Attribute(source, "user.baloo.rating").c_str(), nullptr) / 2, findings);  // half stars
   SetFinderLabel(source, findings);
+  constexpr size_t kPrefix = sizeof("user.") - 1;
+  for (const Noted& noted : kNoted) noted.set(noted.attribute + kPrefix, Attribute(source, noted.attribute), findings);
 }
 
 }  // namespace platform::extract

@@ -7,7 +7,9 @@
 namespace platform::extract {
 
 // Adds tags, comment, rating and the Finder's label from the file's extended attributes, as desktops, and servers for
-// Macs, write them. For a file of any type; what is there counts before what stands in the file. Never throws.
+// Macs, write them, and the fields that nothing else fills: user.VEXOMDDateAdded and user.VEXOMDFinderOpenDate (seconds
+// since the epoch, or a date), user.VEXOMDGroupId, user.VEXOMDSpotlightBoost. For a file of any type; what is there
+// counts before what stands in the file. Never throws.
 void ReadExtendedAttributes(const Source& source, Findings& findings);
 
 }  // namespace platform::extract

@@ -327,7 +327,14 @@ TEST(ExtractMedia, TakesTagsAndLabelsFromExtendedAttributes) {
     ReadExtendedAttributes(Open(fd, "f.txt"), findings);
     return findings.Take();
   };
+  set("user.VEXOMDDateAdded", "1583280000");
+  set("user.VEXOMDFinderOpenDate", "2020-03-04");
+  set("user.VEXOMDGroupId", "g1");
+  set("user.VEXOMDSpotlightBoost", "boost");
   const Json::Value found = read();
+  EXPECT_EQ(found["VEXOMDDateAdded"], 1583280000);
+  EXPECT_EQ(found["VEXOMDFinderOpenDate"], 1583280000);
+  EXPECT_TRUE(found["VEXOMDGroupId"] == "g1" && found["VEXOMDSpotlightBoost"] == "boost");
   EXPECT_EQ(found["_VEXOMDUserTags"], "red ; big ones");
   EXPECT_EQ(found["VEXOMDComment"], "Nice");
   EXPECT_EQ(found["VEXOMDStarRating"], "4");
