@@ -93,7 +93,7 @@ class DoctorTest(unittest.TestCase):
                 ("leftovers", 2, "queue of no share", lambda: (os.makedirs(INDEXES + "odd/db"), (MONITORS / "odd.json").write_text(
                     monitor("docs").read_text().replace("docs/queue", "odd/queue")))),
                 ("leftovers", 1, "a database at", lambda: change_list(lambda folders: folders[:2])),
-                ("flags", 1, "made anew", lambda: machine.write(ETC + "fileindex.status", '{"share": {"docs": 2}}')),
+                ("flags", 1, "made anew", lambda: machine.write(ETC + "fileindex.status", '{"resume_time": 0, "share": {"docs": 2}}')),
                 ("sockets", 1, "0777", lambda: os.chmod("/var/run/fileindexd.sock", 0o777)),
                 ("rights", 1, "0755", lambda: os.chmod(INDEXES + "docs", 0o755)),
                 ("rights", 2, "belongs to", lambda: (os.chmod(LIST, 0o666), os.chown(LIST, 65534, 0))),
