@@ -8,10 +8,9 @@
 
 #include <json/json.h>
 
-namespace platform::extract {
+#include "linux/content_extract_text.h"
 
-// How much text of one file is kept, in bytes of UTF-8.
-inline constexpr size_t kLongestText = size_t{4} << 20;
+namespace platform::extract {
 
 // How long any other text may be. In bytes.
 inline constexpr size_t kLongestField = size_t{64} << 10;
@@ -20,7 +19,7 @@ inline constexpr size_t kLongestField = size_t{64} << 10;
 // first value. Not thread-safe.
 class Findings {
  public:
-  // Goes on with VEXOMDTextContent. False where no more is kept, and looking further is of no use.
+  // Goes on with VEXOMDTextContent, up to kLongestText. False where no more is kept, and looking further is of no use.
   bool AddText(std::string_view text);
   bool IsFull() const { return text_.size() + 4 > kLongestText; }  // the longest character
 

@@ -7,7 +7,7 @@
 #include <ctime>
 #include <limits>
 
-#include <unicode/utf8.h>
+#include "linux/utf8.h"
 
 namespace platform::extract {
 namespace {
@@ -28,16 +28,6 @@ int ZoneOffset(const char* text) {
 
 bool IsIn(int value, int least, int most) {
   return value >= least && value <= most;
-}
-
-bool IsUtf8(std::string_view text) {
-  const auto size = static_cast<int64_t>(text.size());
-  for (int64_t at = 0; at < size;) {
-    UChar32 c = 0;
-    U8_NEXT(reinterpret_cast<const uint8_t*>(text.data()), at, size, c);
-    if (c < 0) return false;
-  }
-  return true;
 }
 
 std::string Latin1AsUtf8(std::string_view text) {

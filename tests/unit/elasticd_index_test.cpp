@@ -1,5 +1,3 @@
-#include <sys/socket.h>
-
 #include <map>
 #include <random>
 #include <set>
@@ -9,26 +7,14 @@
 #include "common/json.h"
 #include "elasticd/error_code.h"
 #include "elasticd/index.h"
-#include "elasticd/server_sender.h"
 #include "fileindex/elastic_control.h"
+#include "support/answer_text.h"
 #include "support/temp_dir.h"
 
 namespace quarrox::elasticd {
 namespace {
 
 using Paths = std::multiset<std::string>;
-
-std::string Read(Answer& answer) {
-  int ends[2];
-  EXPECT_EQ(0, socketpair(AF_UNIX, SOCK_STREAM, 0, ends));
-  EXPECT_EQ(AnswerSender::Progress::kDone, AnswerSender(answer).Send(ends[0]));
-  std::string text(answer.size(), '\0');
-  EXPECT_EQ(4, recv(ends[1], text.data(), 4, 0));
-  EXPECT_EQ(static_cast<ssize_t>(text.size()), recv(ends[1], text.data(), text.size(), MSG_WAITALL));
-  close(ends[0]);
-  close(ends[1]);
-  return text;
-}
 
 Json::Value Parse(const std::string& text) {
   Json::Value value;

@@ -1,5 +1,3 @@
-#include <sys/socket.h>
-
 #include <cstdlib>
 #include <ctime>
 #include <random>
@@ -11,9 +9,9 @@
 #include "elasticd/index.h"
 #include "elasticd/line_values.h"
 #include "elasticd/search_line.h"
-#include "elasticd/server_sender.h"
 #include "elasticd/snippet.h"
 #include "fileindex/elastic_control.h"
+#include "support/answer_text.h"
 #include "support/temp_dir.h"
 
 namespace quarrox::elasticd {
@@ -24,18 +22,6 @@ using testing::StartsWith;
 using Names = std::vector<std::string>;
 
 constexpr int64_t kNow = 1714564800;  // 2024-05-01 12:00 UTC
-
-std::string Read(Answer& answer) {
-  int ends[2];
-  EXPECT_EQ(0, socketpair(AF_UNIX, SOCK_STREAM, 0, ends));
-  EXPECT_EQ(AnswerSender::Progress::kDone, AnswerSender(answer).Send(ends[0]));
-  std::string text(answer.size(), '\0');
-  EXPECT_EQ(4, recv(ends[1], text.data(), 4, 0));
-  EXPECT_EQ(static_cast<ssize_t>(text.size()), recv(ends[1], text.data(), text.size(), MSG_WAITALL));
-  close(ends[0]);
-  close(ends[1]);
-  return text;
-}
 
 // An index in which files are written as names below /v with their texts, and searched by lines.
 class SearchTest : public testing::Test {

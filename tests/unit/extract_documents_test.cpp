@@ -424,8 +424,8 @@ TEST(ExtractDocuments, KeepNoMoreTextThanIsKept) {
                                            {"message/rfc822", "Subject: x\n\n" + words},
                                            {"application/gzip", Pack("raw", "gzip", {{"", words}})}}) {
     const Found found = Extract(type, bytes);
-    EXPECT_LE(found.text().size(), kLongestText) << type;
-    EXPECT_GT(found.text().size(), kLongestText - 100) << type;
+    EXPECT_LE(found.text().size(), platform::kLongestText) << type;
+    EXPECT_GT(found.text().size(), platform::kLongestText - 100) << type;
     EXPECT_EQ(found.damage, "") << type;
   }
 }
