@@ -270,6 +270,7 @@ SearchResult Reader::Search(Query query, const SearchOptions& options) const {
     const Decider decider(query.TakeChecks());
     Converter converter(impl_->database);
     enquire.set_query(converter.Convert(query));
+    if (options.discreet) enquire.set_weighting_scheme(OwnWeight());
     Xapian::MultiValueKeyMaker keys;
     for (const auto& [field, descending] : options.sort) keys.add_value(kFirstNumberSlot + field, descending);
     if (!options.sort.empty()) enquire.set_sort_by_key_then_relevance(&keys, false);
@@ -282,7 +283,7 @@ SearchResult Reader::Search(Query query, const SearchOptions& options) const {
     for (Xapian::MSetIterator hit = found.begin(); hit != found.end(); ++hit) {
       result.hits.push_back({*hit, hit.get_weight()});
     }
-    result.total = found.get_matches_estimated();
+    result.total = options.discreet ? found.get_matches_lower_bound() : found.get_matches_estimated();
     result.cut = converter.cut();
     result.exact = found.get_matches_lower_bound() == found.get_matches_upper_bound();
     return result;
@@ -291,6 +292,29 @@ SearchResult Reader::Search(Query query, const SearchOptions& options) const {
 
 uint64_t Reader::CountWith(const std::string& term) const {
   return Guard([&] { return impl_->database.get_termfreq(term); });
+}
+
+bool Reader::Has(DocumentId id, const std::string& term) const {
+  return Guard([&] {
+    Xapian::PostingIterator posting = impl_->database.postlist_begin(term);
+    const Xapian::PostingIterator end = impl_->database.postlist_end(term);
+    if (posting != end) posting.skip_to(id);
+    return posting != end && *posting == id;
+  });
+}
+
+std::vector<std::string> Reader::Terms(const std::string& begin) const {
+  return Guard([&] {
+    return std::vector<std::string>(impl_->database.allterms_begin(begin), impl_->database.allterms_end(begin));
+  });
+}
+
+double Reader::Number(DocumentId id, unsigned int field) const {
+  return Guard([&] {
+    const std::string value =
+        impl_->database.get_document(id, Xapian::DOC_ASSUME_VALID).get_value(kFirstNumberSlot + field);
+    return value.empty() ? std::numeric_limits<double>::quiet_NaN() : Xapian::sortable_unserialise(value);
+  });
 }
 
 std::string Reader::Suggestion(const std::string& word) const {

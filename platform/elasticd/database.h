@@ -109,6 +109,10 @@ struct SearchOptions {
   uint64_t from = 0;
   uint64_t size = ~uint64_t{0};
   std::vector<std::pair<unsigned int, bool>> sort;  // numbers of fields and whether descending; by score where empty
+
+  // What is told follows from the documents that pass alone: no score depends on how many others have a word, and a
+  // total that is not exact is of those that were seen, which is at least so many.
+  bool discreet = false;
 };
 
 // Sees what was committed when it was made or last refreshed.
@@ -128,8 +132,15 @@ class Reader final : public Store {
 
   SearchResult Search(Query query, const SearchOptions& options) const;
 
-  // How many documents have a term.
+  // How many documents have a term, and whether one has it.
   uint64_t CountWith(const std::string& term) const;
+  bool Has(DocumentId id, const std::string& term) const;
+
+  // The terms that begin so.
+  std::vector<std::string> Terms(const std::string& begin) const;
+
+  // A document's number in a field; NaN where it has none.
+  double Number(DocumentId id, unsigned int field) const;
 
   // The word among the suggestions that is most like another one; empty where none is. Documents need not have it.
   std::string Suggestion(const std::string& word) const;

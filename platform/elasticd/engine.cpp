@@ -1,10 +1,13 @@
 #include "engine.h"
 
+#include <algorithm>
 #include <exception>
+#include <optional>
 #include <utility>
 #include <vector>
 
 #include "common/json.h"
+#include "common/search_socket.h"
 #include "database.h"
 #include "error_code.h"
 #include "index_files.h"
@@ -73,7 +76,17 @@ SearchRequest ParseSearch(const Json::Value& query) {
   return search;
 }
 
+// The user whose search it is to be; nothing for root, who may read everything.
+std::optional<Identity> ParseUser(const Json::Value& data) {
+  if (!data.isMember("as")) return std::nullopt;
+  const std::string name = Text(data, "as");
+  const std::optional<Identity> user = FindIdentity(name);
+  if (!user) throw Error(kBadArgument, "There is no user " + name);
+  return user->user == 0 ? std::nullopt : user;
+}
+
 constexpr char kUpsert[] = "document_upsert_by_id";
+constexpr char kSearch[] = "document_get_by_query";
 
 std::string Failure(const Error& error) {
   return Engine::Refusal(error.code, error.reason);
@@ -111,7 +124,7 @@ const std::map<std::string, Engine::Command>& Engine::Commands() {
       {"document_set_by_id", {&Engine::DocumentSet, false}},
       {"document_del_by_id", {&Engine::DocumentDelete, false}},
       {"document_del_by_query", {&Engine::DocumentDeleteByQuery, false}},
-      {"document_get_by_query", {&Engine::DocumentGetByQuery, true}},
+      {kSearch, {&Engine::DocumentGetByQuery, true}},
       {"commit", {&Engine::Commit, false}},
       {"list_term_sugg_db", {&Engine::ListTermSuggestions, true}},
       {"update_term_suggestion", {&Engine::UpdateTermSuggestion, false}},
@@ -170,6 +183,34 @@ Engine::Rest Engine::Handle(const std::string& request, Answer& answer, const Ma
     answer.Append(Failure(error));
   }
   return rest;
+}
+
+void Engine::HandleSearch(const Identity& user, const std::string& request, Answer& answer) {
+  try {
+    AsErrors([&] {
+      Json::Value parsed;
+      if (!fromString(parsed, request) || !parsed.isObject() || !parsed["data"].isObject()) {
+        throw Error(kMalformedRequest, "A request is an object with \"command\" and \"data\"");
+      }
+      if (parsed["command"] != kSearch)
+        throw Error(kUnknownCommand, std::string("Users may ask for ") + kSearch + " only");
+      const Json::Value& data = parsed["data"];
+      SearchRequest search = ParseSearch(Object(data, "query"));
+      const std::optional<Identity> named = data.isMember("as") ? FindIdentity(Text(data, "as")) : user;
+      if (!named || named->user != user.user) throw Error(kBadArgument, "Only root may search as another user");
+      if (!data["query"].isMember("size")) search.size = kMostHitsOfUsers - std::min(search.from, kMostHitsOfUsers);
+      if (search.from > kMostHitsOfUsers || search.size > kMostHitsOfUsers - search.from) {
+        throw Error(kBadQuery, "Ask for no more than the first " + std::to_string(kMostHitsOfUsers) + " hits");
+      }
+      if (user.user != 0) search.as = user;
+      answer.Append("{\"success\":true,\"data\":");
+      Get(data)->Find(search, answer);
+      answer.Append("}");
+    });
+  } catch (const Error& error) {
+    answer.Clear();
+    answer.Append(Failure(error));
+  }
 }
 
 // The one command that comes by the thousand: it is answered as soon as it cannot be refused any more, so that the
@@ -336,7 +377,8 @@ void Engine::DocumentDeleteByQuery(const Json::Value& data, Answer&) {
 }
 
 void Engine::DocumentGetByQuery(const Json::Value& data, Answer& answer) {
-  const SearchRequest search = ParseSearch(Object(data, "query"));
+  SearchRequest search = ParseSearch(Object(data, "query"));
+  search.as = ParseUser(data);
   Get(data)->Find(search, answer);
 }
 

@@ -11,6 +11,7 @@
 
 #include "answer.h"
 #include "common/error.h"
+#include "common/peer.h"
 #include "index.h"
 #include "recovery.h"
 #include "registry.h"
@@ -30,6 +31,9 @@ class Engine {
   using MakeWay = std::function<void()>;
   using Rest = std::function<void()>;
   Rest Handle(const std::string& request, Answer& answer, const MakeWay& make_way);
+
+  // Answers a search of somebody who may do nothing else, as that user. Throws nothing.
+  void HandleSearch(const Identity& user, const std::string& request, Answer& answer);
 
   // The answer to a request that is refused.
   static std::string Refusal(ErrorCode code, const std::string& reason);

@@ -438,7 +438,7 @@ void Index::Commit() {
 }
 
 void Index::Find(const SearchRequest& request, Answer& answer) {
-  const std::optional<PathQuery> query = AsPathQuery(request.qsl, mapping_);
+  const std::optional<PathQuery> query = request.as ? std::nullopt : AsPathQuery(request.qsl, mapping_);
   if (query) return ShowByPath(query->path, query->is_prefix, request, answer);
   Search(request, answer);
 }

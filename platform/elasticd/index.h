@@ -15,6 +15,7 @@
 #include "analysis.h"
 #include "answer.h"
 #include "common/error.h"
+#include "common/peer.h"
 #include "database.h"
 #include "fields.h"
 #include "index_files.h"
@@ -30,7 +31,8 @@ struct SearchRequest {
   uint64_t from = 0;
   uint64_t size = ~uint64_t{0};
   Json::Value sort;
-  bool suggest = false;  // where hardly anything is found, look for words that were meant
+  bool suggest = false;        // where hardly anything is found, look for words that were meant
+  std::optional<Identity> as;  // whose search it is: nothing speaks of what they may not read
 };
 
 struct Searches;

@@ -1,10 +1,13 @@
 #include "index_searches.h"
 
 #include <algorithm>
+#include <memory>
+#include <utility>
 
 #include "common/json.h"
 #include "error_code.h"
 #include "query_parser.h"
+#include "readable.h"
 #include "snippet.h"
 
 namespace quarrox::elasticd {
@@ -115,14 +118,6 @@ class HitWriter {
   SnippetWords snippet_words_;
 };
 
-// How many documents have a word that is looked for in no particular field; of those that have it under several
-// prefixes, the most under one.
-uint64_t CountWith(const Reader& reader, const Mapping& mapping, const std::string& word) {
-  uint64_t most = 0;
-  for (const std::string& prefix : PrefixesOfAll(mapping)) most = std::max(most, reader.CountWith(prefix + word));
-  return most;
-}
-
 // The line in a query as the command asks it: alone, or first among what must be.
 Json::Value* FindLine(Json::Value& qsl) {
   Json::Value* at = &qsl;
@@ -140,25 +135,68 @@ Json::Value* FindLine(Json::Value& qsl) {
   return at->isString() ? at : nullptr;
 }
 
-// The line with words that documents have in place of those that none has, where that finds more; else empty.
-std::string Suggest(const Reader& reader, const Mapping& mapping, QueryParser& parser, Json::Value qsl,
-                    const std::vector<LineWord>& words, uint64_t found) {
-  Json::Value* const line = FindLine(qsl);
-  if (line == nullptr) return {};
-  std::string changed = line->asString();
-  for (auto word = words.rbegin(); word != words.rend(); ++word) {
-    if (word->pieces.size() != 1 || word->pieces.front().ideographs || word->beginning) continue;
-    const uint64_t known = CountWith(reader, mapping, word->pieces.front().text);
-    const std::string meant = reader.Suggestion(word->pieces.front().text);
-    if (meant.empty() || CountWith(reader, mapping, meant) <= known * kMuchMore) continue;
-    const bool quoted = changed[word->begin] == '"';
-    changed.replace(word->begin, word->end - word->begin, quoted ? '"' + meant + '"' : meant);
+// One question of somebody: its query, and what else has to be looked for to answer it.
+class Question {
+ public:
+  Question(Searches& searches, const Mapping& mapping, const PathFields& path_fields, const SearchRequest& request)
+      : reader_(searches.reader),
+        mapping_(mapping),
+        request_(request),
+        options_{request.from, request.size, ParseSort(mapping, request.sort), request.as.has_value()},
+        parser_(mapping, path_fields, searches.reader, searches.places) {
+    if (request.as) readable_ = std::make_unique<ReadableOnly>(searches.reader, searches.places, mapping, *request.as);
   }
-  if (changed == line->asString()) return {};
-  *line = changed;
-  const SearchOptions none{0, 0, {}};
-  return reader.Search(parser.Parse(qsl), none).total > found ? changed : std::string();
-}
+
+  SearchResult Ask() { return Search(parser_.Parse(request_.qsl), options_); }
+
+  const std::vector<LineWord>& words() const { return parser_.line_words(); }
+  bool cut() const { return parser_.cut(); }
+
+  // The line with words that documents have in place of those that none has, where that finds more than `found`; else
+  // empty.
+  std::string Suggest(uint64_t found) {
+    const std::vector<LineWord> words = parser_.first_line_words();
+    Json::Value qsl = request_.qsl;
+    Json::Value* const line = FindLine(qsl);
+    if (line == nullptr) return {};
+    std::string changed = line->asString();
+    for (auto word = words.rbegin(); word != words.rend(); ++word) {
+      if (word->pieces.size() != 1 || word->pieces.front().ideographs || word->beginning) continue;
+      const std::string meant = reader_.Suggestion(word->pieces.front().text);
+      if (meant.empty() || CountWith(meant) <= CountWith(word->pieces.front().text) * kMuchMore) continue;
+      const bool quoted = changed[word->begin] == '"';
+      changed.replace(word->begin, word->end - word->begin, quoted ? '"' + meant + '"' : meant);
+    }
+    if (changed == line->asString()) return {};
+    *line = changed;
+    return Search(parser_.Parse(qsl), JustCount()).total > found ? changed : std::string();
+  }
+
+ private:
+  SearchOptions JustCount() const { return {0, 0, {}, options_.discreet}; }
+
+  SearchResult Search(Query query, const SearchOptions& options) const {
+    return reader_.Search(readable_ ? readable_->Restrict(std::move(query)) : std::move(query), options);
+  }
+
+  // How many documents have a word that is looked for in no particular field; of those that have it under several
+  // prefixes, the most under one.
+  uint64_t CountWith(const std::string& word) const {
+    uint64_t most = 0;
+    for (const std::string& prefix : PrefixesOfAll(mapping_)) {
+      most = std::max(
+          most, readable_ ? Search(Query::Term(prefix + word), JustCount()).total : reader_.CountWith(prefix + word));
+    }
+    return most;
+  }
+
+  const Reader& reader_;
+  const Mapping& mapping_;
+  const SearchRequest& request_;
+  const SearchOptions options_;
+  QueryParser parser_;
+  std::unique_ptr<ReadableOnly> readable_;
+};
 
 }  // namespace
 
@@ -180,11 +218,10 @@ void Index::SearchCommitted(const SearchRequest& request, Answer& answer) {
   }
   Reader& reader = searches_->reader;
   Places& places = searches_->places;
-  QueryParser parser(mapping_, path_fields_, reader, places);
-  const SearchOptions options{request.from, request.size, ParseSort(mapping_, request.sort)};
-  const SearchResult result = Retry(reader, places, [&] { return reader.Search(parser.Parse(request.qsl), options); });
+  Question question(*searches_, mapping_, path_fields_, request);
+  const SearchResult result = Retry(reader, places, [&] { return question.Ask(); });
 
-  HitWriter writer(*searches_, mapping_, path_fields_, request.load_fields, parser.line_words());
+  HitWriter writer(*searches_, mapping_, path_fields_, request.load_fields, question.words());
   answer.Append("[");
   bool first = true;
   for (const Hit& hit : result.hits) {
@@ -193,11 +230,10 @@ void Index::SearchCommitted(const SearchRequest& request, Answer& answer) {
   }
   answer.Append("],\"total\":" + std::to_string(result.total));
   answer.Append(result.exact ? ",\"exact\":true" : ",\"exact\":false");
-  if (result.cut || parser.cut()) answer.Append(",\"cut\":true");
+  if (request.as && !result.exact) answer.Append(",\"at_least\":true");
+  if (result.cut || question.cut()) answer.Append(",\"cut\":true");
   if (!request.suggest || result.total >= kLittle) return;
-  const std::vector<LineWord> words = parser.first_line_words();
-  const auto suggestion =
-      Retry(reader, places, [&] { return Suggest(reader, mapping_, parser, request.qsl, words, result.total); });
+  const auto suggestion = Retry(reader, places, [&] { return question.Suggest(result.total); });
   if (!suggestion.empty()) answer.Append(",\"suggestion\":" + toString(Json::Value(suggestion)));
 }
 

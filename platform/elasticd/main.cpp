@@ -12,10 +12,12 @@
 #include <systemd/sd-daemon.h>
 
 #include "common/log.h"
+#include "common/search_socket.h"
 #include "engine.h"
 #include "error_code.h"
 #include "options.h"
 #include "server.h"
+#include "user_searches.h"
 
 namespace {
 
@@ -43,11 +45,12 @@ sigset_t BlockSignals() {
 // Stops the server when a signal says so. The thread ends with this object, also where the server failed.
 class Stopper {
  public:
-  Stopper(const sigset_t& signals, Server& server)
-      : thread_([&signals, &server] {
+  Stopper(const sigset_t& signals, Server& server, Server& searches)
+      : thread_([&signals, &server, &searches] {
           int signal = 0;
           sigwait(&signals, &signal);
           sd_notify(0, "STOPPING=1");
+          searches.Stop();
           server.Stop();
         }) {}
   ~Stopper() {
@@ -65,16 +68,27 @@ class Stopper {
 void Run(const Options& options) {
   const sigset_t signals = BlockSignals();
   MakeDirectory(options.data);
+  const auto refuse = [](const std::string& reason) { return Engine::Refusal(kMalformedRequest, reason); };
   std::unique_ptr<Engine> engine;
   Server server(
       {kSocketPath, options.data + "/spool"},
-      [&](const std::string& request, Answer& answer, const Server::MakeWay& make_way) {
+      [&](int, const std::string& request, Answer& answer, const Server::MakeWay& make_way) {
         return engine->Handle(request, answer, make_way);
       },
-      [](const std::string& reason) { return Engine::Refusal(kMalformedRequest, reason); });
+      refuse);
   engine = std::make_unique<Engine>(options.data);
+  UserSearches user_searches(*engine);
+  Server searches(
+      {kSearchSocketPath, options.data + "/spool", true},
+      [&](int client, const std::string& request, Answer& answer, const Server::MakeWay& make_way) {
+        make_way();
+        user_searches.Handle(client, request, answer);
+        return Server::Rest();
+      },
+      refuse);
   {
-    const Stopper stopper(signals, server);
+    const std::jthread serving([&searches] { searches.Run(); });
+    const Stopper stopper(signals, server, searches);
     sd_notify(0, "READY=1");
     server.Run();
   }

@@ -32,6 +32,10 @@ constexpr int kLingerMilliseconds = 1;  // a client needs some microseconds to c
 constexpr std::chrono::seconds kAcceptPause(1);
 
 constexpr size_t kMostConnections = 16384;
+constexpr size_t kMostConnectionsOfAll = 256;
+
+// The longest request of anybody: a person's line with what goes along takes far less.
+constexpr size_t kLongestOfAll = size_t{1} << 20;
 
 // Files of the engine itself.
 constexpr size_t kOtherDescriptors = 512;
@@ -61,6 +65,10 @@ size_t RaiseLimit() {
   return std::min(kMostConnections, std::max(descriptors / 4, descriptors - std::min(descriptors, kOtherDescriptors)));
 }
 
+DaemonListener::Audience AudienceOf(const Server::Settings& settings) {
+  return settings.for_everybody ? DaemonListener::Audience::kEverybody : DaemonListener::Audience::kGroup;
+}
+
 }  // namespace
 
 struct Server::Impl {
@@ -68,11 +76,16 @@ struct Server::Impl {
       : settings(std::move(given)),
         handler(std::move(handle)),
         refuse(std::move(make_refusal)),
-        listener(settings.path, rights.group(), "vexoelasticd"),
+        listener(settings.path, rights.group(), "vexoelasticd", AudienceOf(settings)),
         epoll(epoll_create1(EPOLL_CLOEXEC)),
         stop(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)),
-        table(epoll.get(), RaiseLimit()),
-        shared{table, handler, refuse, settings.spool_directory} {
+        table(epoll.get(), settings.for_everybody ? kMostConnectionsOfAll : RaiseLimit()),
+        shared{table,
+               handler,
+               refuse,
+               settings.spool_directory,
+               settings.for_everybody ? kLongestOfAll : SIZE_MAX,
+               !settings.for_everybody} {
     SetUpMemory();
     Watch(EPOLL_CTL_ADD, listener.fd(), kListenerToken);
     Watch(EPOLL_CTL_ADD, stop.get(), kStopToken);
@@ -233,7 +246,7 @@ void Server::Impl::Welcome(Worker& worker, UniqueFd& client) {
     connection = table.Admit(client);
     if (connection == nullptr) return worker.SendRefusal(client.get(), full);
   }
-  if (rights.MayCommand(connection->fd.get())) return worker.Serve(*connection);
+  if (settings.for_everybody || rights.MayCommand(connection->fd.get())) return worker.Serve(*connection);
   worker.Refuse(*connection, "The user may not use the engine; root and the members of the group Quarrox may");
 }
 

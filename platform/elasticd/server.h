@@ -26,11 +26,11 @@ class Server {
   // What is left to do for a request after its answer; may be empty.
   using Rest = std::function<void()>;
 
-  // Carries out a request and makes the answer. Called from any thread, also at the same time. Must not throw, nor must
-  // the rest that it returns. Both call `make_way`, which lives as long as they run, before anything that takes longer
-  // than a moment: where a single client asks one thing after the other, its thread need not hand over to another one
-  // each time.
-  using Handler = std::function<Rest(const std::string& request, Answer& answer, const MakeWay& make_way)>;
+  // Carries out a request of the client behind a socket and makes the answer. Called from any thread, also at the same
+  // time. Must not throw, nor must the rest that it returns. Both call `make_way`, which lives as long as they run,
+  // before anything that takes longer than a moment: where a single client asks one thing after the other, its thread
+  // need not hand over to another one each time.
+  using Handler = std::function<Rest(int client, const std::string& request, Answer& answer, const MakeWay& make_way)>;
 
   // Makes the answer to a request that never reached the handler; `reason` is for people.
   using Refuse = std::function<std::string(const std::string& reason)>;
@@ -38,6 +38,10 @@ class Server {
   struct Settings {
     std::string path;             // of the socket
     std::string spool_directory;  // for large answers
+
+    // Whoever can connect may ask, then, and the handler decides what: fewer connections, small requests, and nothing
+    // of what is refused is logged.
+    bool for_everybody = false;
   };
 
   // Listens. Throws Error 502 where another living process has the socket or it cannot be made.

@@ -9,6 +9,7 @@
 
 #include "common/error.h"
 #include "common/log.h"
+#include "error_code.h"
 
 namespace quarrox::elasticd {
 namespace {
@@ -88,7 +89,7 @@ void Worker::SettleLingering() {
 void Worker::End(Connection& connection) {
   if (!connection.reader.empty()) {
     const std::string reason = "The request was cut short";
-    QUARROX_LOG_FAILURE("A client is refused, reason: %s", reason.c_str());
+    LogRefusal(reason);
     SendRefusal(connection.fd.get(), reason);
   }
   table_.Release(connection);
@@ -99,6 +100,10 @@ bool Worker::Consume(Connection& connection, std::string_view data) {
   try {
     while (!data.empty()) {
       data.remove_prefix(connection.reader.Add(data));
+      if (connection.reader.text().size() > shared_.longest_request) {
+        throw Error(kMalformedRequest,
+                    "The request is longer than " + std::to_string(shared_.longest_request) + " bytes");
+      }
       if (connection.reader.whole() && !CarryOut(connection, data)) return false;
     }
     return true;
@@ -115,7 +120,7 @@ bool Worker::CarryOut(Connection& connection, std::string_view rest) {
   if (table_.HasSeveral()) make_way_();
   if (connection.listed) table_.Unlist(connection);
   answer_->Clear();
-  const Server::Rest todo = shared_.handler(connection.reader.text(), *answer_, make_way_);
+  const Server::Rest todo = shared_.handler(connection.fd.get(), connection.reader.text(), *answer_, make_way_);
   const bool goes_on = SendAnswer(connection, rest);
   if (!todo) return goes_on;
   if (!goes_on || table_.HasSeveral()) make_way_();
@@ -196,9 +201,14 @@ void Worker::SendRefusal(int socket, const std::string& reason) {
   AnswerSender(*answer_).Send(socket);
 }
 
-void Worker::Refuse(Connection& connection, const std::string& reason) {
+void Worker::LogRefusal(const std::string& reason) const {
+  if (!shared_.logs_refusals) return;
   errno = 0;
   QUARROX_LOG_FAILURE("A client is refused, reason: %s", reason.c_str());
+}
+
+void Worker::Refuse(Connection& connection, const std::string& reason) {
+  LogRefusal(reason);
   TurnAway(connection, reason);
 }
 

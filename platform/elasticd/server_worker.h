@@ -20,6 +20,8 @@ class Worker {
     const Server::Handler& handler;
     const Server::Refuse& refuse;
     const std::string& spool_directory;
+    size_t longest_request = SIZE_MAX;
+    bool logs_refusals = true;
     std::atomic<size_t> unread = 0;  // memory of the answers that wait to be read
   };
 
@@ -45,6 +47,7 @@ class Worker {
   void SendRefusal(int socket, const std::string& reason);
 
  private:
+  void LogRefusal(const std::string& reason) const;
   void Read(Connection& connection);
   bool ComesSoon(const Connection& connection) const;
   void Drain(Connection& connection);

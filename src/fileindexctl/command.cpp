@@ -71,10 +71,10 @@ const std::vector<Command> kCommands = {
     {"resume", "", "[--json]", "end a pause", {"--json"}, 0, Resume},
     {"search",
      "",
-     "[--share SHARE] [--name] [--type TYPE,...] [--limit N] [--offset N] [--json] QUERY",
+     "[--share SHARE] [--name] [--type TYPE,...] [--as USER] [--limit N] [--offset N] [--json] QUERY",
      "find files by words, phrases, name, type, size, date and place, or with --name by parts of their names; best "
      "first",
-     {"--share=", "--name", "--type=", "--limit=", "--offset=", "--json"},
+     {"--share=", "--name", "--type=", "--as=", "--limit=", "--offset=", "--json"},
      1,
      Search},
     {"share", "list", "[--json]", "list the shares and whether they can be indexed", {"--json"}, 0, ShareList},

@@ -15,12 +15,6 @@
 namespace quarrox::ctl {
 namespace {
 
-// For each of connecting, sending, and the two parts of a frame.
-constexpr timeval kPatience = {.tv_sec = 5, .tv_usec = 0};
-
-// What is asked for here is answered in far less.
-constexpr uint32_t kLongestAnswer = 1 << 20;
-
 [[noreturn]] void Fail(const std::string& what) {
   throw Error(kErrSystem, what);
 }
@@ -30,14 +24,16 @@ constexpr uint32_t kLongestAnswer = 1 << 20;
   Fail(error == EAGAIN || error == EINPROGRESS ? "it does not answer in time" : strerror(error));
 }
 
-UniqueFd Connect(const std::string& path) {
+// The time is for each of connecting, sending, and the two parts of a frame.
+UniqueFd Connect(const std::string& path, int seconds) {
+  const timeval patience = {.tv_sec = seconds, .tv_usec = 0};
   sockaddr_un address = {};
   address.sun_family = AF_UNIX;
   if (path.size() >= sizeof(address.sun_path)) FailCall(ENAMETOOLONG);
   memcpy(address.sun_path, path.data(), path.size());
   UniqueFd fd(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
-  if (!fd || setsockopt(fd.get(), SOL_SOCKET, SO_SNDTIMEO, &kPatience, sizeof(kPatience)) != 0 ||
-      setsockopt(fd.get(), SOL_SOCKET, SO_RCVTIMEO, &kPatience, sizeof(kPatience)) != 0 ||
+  if (!fd || setsockopt(fd.get(), SOL_SOCKET, SO_SNDTIMEO, &patience, sizeof(patience)) != 0 ||
+      setsockopt(fd.get(), SOL_SOCKET, SO_RCVTIMEO, &patience, sizeof(patience)) != 0 ||
       connect(fd.get(), reinterpret_cast<const sockaddr*>(&address), sizeof(address)) != 0) {
     FailCall(errno);
   }
@@ -60,12 +56,12 @@ void Receive(int fd, void* data, size_t size) {
   if (static_cast<size_t>(received) != size) Fail("its answer is cut short");
 }
 
-DaemonAnswer TryExchange(const std::string& socket_path, const Json::Value& request) {
-  const UniqueFd fd = Connect(socket_path);
+DaemonAnswer TryExchange(const std::string& socket_path, const Json::Value& request, ExchangeLimits limits) {
+  const UniqueFd fd = Connect(socket_path, limits.seconds);
   SendFrame(fd.get(), toString(request));
   uint32_t length = 0;
   Receive(fd.get(), &length, sizeof(length));
-  if (length == 0 || length > kLongestAnswer) Fail("its answer is no frame");
+  if (length == 0 || length > limits.longest) Fail("its answer is no frame");
   std::string text(length, '\0');
   Receive(fd.get(), text.data(), length);
   text.pop_back();
@@ -81,9 +77,9 @@ DaemonAnswer TryExchange(const std::string& socket_path, const Json::Value& requ
 
 }  // namespace
 
-DaemonAnswer Exchange(const std::string& socket_path, const Json::Value& request) {
+DaemonAnswer Exchange(const std::string& socket_path, const Json::Value& request, ExchangeLimits limits) {
   try {
-    return TryExchange(socket_path, request);
+    return TryExchange(socket_path, request, limits);
   } catch (const Error& error) {
     throw Error(error.code, "no answer at " + socket_path + ": " + error.reason);
   }

@@ -13,6 +13,7 @@ namespace {
 
 // What each option does, whichever command takes it.
 const std::pair<const char*, const char*> kOptionTexts[] = {
+    {"--as=", "as this user, leaving out what they may not read; only root may name another one"},
     {"--complete", "print what a shell can complete the last of the words to"},
     {"--desc", "the last first"},
     {"--follow", "go on and show each change, until Ctrl-C"},

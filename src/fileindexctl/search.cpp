@@ -3,6 +3,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <cstdint>
 #include <cstdlib>
 #include <iostream>
@@ -18,7 +19,9 @@
 #include "common/error.h"
 #include "common/json.h"
 #include "common/sdk/share.h"
+#include "common/search_socket.h"
 #include "common/strings.h"
+#include "daemon_exchange.h"
 #include "fileindex/elastic_control.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/util.h"
@@ -151,9 +154,34 @@ Hit AsHit(const std::string& share, const Json::Value& fields) {
   throw Error(static_cast<ErrorCode>(int{kElasticdBadQuery}), reason);
 }
 
-void SearchShare(const std::string& share, const Json::Value& qsl, Page page, Found& found) {
+// Whose search it is: who may not command the engine asks as themselves, at a socket that knows who they are.
+struct Asker {
+  std::string user = {};  // empty: whoever runs the command
+  bool is_ordinary = false;
+};
+
+// A search may take the engine seconds, and others may be before it.
+constexpr ExchangeLimits kSearchLimits = {.seconds = 60, .longest = uint32_t{256} << 20};
+
+Json::Value Answered(const Json::Value& request, const Asker& asker) {
+  Json::Value response;
+  if (!asker.is_ordinary) {
+    SendRequestImpl(response, request);
+    return response;
+  }
+  response = Exchange(kSearchSocketPath, request, kSearchLimits).object;
+  if (response["success"].asBool()) return response;
+  const Json::Value& error = std::as_const(response)["error"];
+  if (!error.isObject() || !error["code"].isInt() || !error["msg"].isString()) {
+    throw Error(kErrEngineReceive, toString(response));
+  }
+  throw Error(static_cast<ErrorCode>(error["code"].asInt()), error["msg"].asString());
+}
+
+void SearchShare(const std::string& share, const Json::Value& qsl, Page page, const Asker& asker, Found& found) {
   Json::Value request(Json::objectValue);
   request["command"] = "document_get_by_query";
+  if (!asker.user.empty()) request["data"]["as"] = asker.user;
   request["data"]["id"] = fileindex::elastic::GetFileIndexID(share);
   Json::Value& query = request["data"]["query"];
   query["qsl"] = qsl;
@@ -162,8 +190,7 @@ void SearchShare(const std::string& share, const Json::Value& qsl, Page page, Fo
   query["suggest"] = true;
   query["from"] = Json::UInt64{page.from};
   query["size"] = Json::UInt64{page.size};
-  Json::Value response;
-  SendRequestImpl(response, request);
+  const Json::Value response = Answered(request, asker);
   const Json::Value& hits = std::as_const(response)["data"];
   if (!hits.isArray()) throw Error(kErrEngineNoData, toString(response));
   for (const Json::Value& hit : hits) found.hits.push_back(AsHit(share, hit));
@@ -174,21 +201,22 @@ void SearchShare(const std::string& share, const Json::Value& qsl, Page page, Fo
     return member.isBool() && member.asBool() == value;
   };
   if (has("exact", false)) found.total_is_exact = false;
+  if (has("at_least", true)) found.total_is_least = true;
   if (has("cut", true)) found.cut = true;
   if (found.suggestion.empty()) GetJsonValue(found.suggestion, response, "suggestion", false);
 }
 
-Found SearchShares(const std::set<std::string>& shares, const std::string& line, const Json::Value& qsl, Page page) {
-  // The channel waits for an engine that is about to start; a person need not.
-  if (access(kElasticdSocketPath, F_OK) != 0) throw Error(kErrEngineReceive, "the search engine is not running");
+Found SearchShares(const std::set<std::string>& shares, const std::string& line, const Json::Value& qsl, Page page,
+                   const Asker& asker) {
   Found found;
   for (const std::string& share : shares) {
     try {
-      SearchShare(share, qsl, page, found);
+      SearchShare(share, qsl, page, asker, found);
     } catch (const Error& error) {
       if (int{error.code} == kElasticdBadQuery) RefuseLine(line, error.reason);
       const bool is_paused = int{error.code} == kElasticdIndexPaused;
       if (!is_paused && int{error.code} != kElasticdNoSuchIndex) throw;
+      if (!is_paused && asker.is_ordinary) continue;  // it may well be none of those that are indexed
       std::cerr << "fileindexctl: the share " << Visible(share) << (is_paused ? " is paused" : " has no index yet")
                 << ", so it is left out\n";
     }
@@ -201,6 +229,23 @@ Found SearchShares(const std::set<std::string>& shares, const std::string& line,
   return found;
 }
 
+Asker WhoAsks(const Arguments& arguments) {
+  Asker asker{arguments.Value("--as", "")};
+  if (arguments.Has("--as") && asker.user.empty()) throw UsageError("--as takes the login name of a user");
+  if (access(kElasticdSocketPath, W_OK) == 0) return asker;
+  // The channel waits for an engine that is about to start; a person need not.
+  if (errno != EACCES) throw Error(kErrEngineReceive, "the search engine is not running");
+  asker.is_ordinary = true;
+  return asker;
+}
+
+// Ordinary users do not see the list of folders; the engine says which shares have no index.
+std::set<std::string> SharesToSearch(const Arguments& arguments, const Asker& asker) {
+  if (arguments.Has("--share")) return {sdk::SDKShare(arguments.Value("--share", "")).GetName()};
+  if (!asker.is_ordinary) return fileindex::FolderMgr().GetIndexedShares();
+  return sdk::SDKShare::Enum();
+}
+
 }  // namespace
 
 int Search(const Arguments& arguments) {
@@ -208,19 +253,15 @@ int Search(const Arguments& arguments) {
   const size_t offset = arguments.Number("--offset", 0);
   const size_t limit = arguments.Number("--limit", kDefaultLimit);
   const size_t end = offset + std::min(limit, SIZE_MAX - offset);
-  std::set<std::string> shares;
-  if (arguments.Has("--share")) {
-    shares = {sdk::SDKShare(arguments.Value("--share", "")).GetName()};
-  } else {
-    shares = fileindex::FolderMgr().GetIndexedShares();
-  }
+  const Asker asker = WhoAsks(arguments);
+  const std::set<std::string> shares = SharesToSearch(arguments, asker);
   if (shares.empty()) std::cerr << "fileindexctl: no folder is indexed\n";
 
   // The best of several shares are known when the best of each are.
   const size_t begin = shares.size() == 1 ? offset : 0;
   const bool is_as_typed = !arguments.Has("--name") && !arguments.Has("--type");
   const std::string line = is_as_typed ? arguments.operands().front() : std::string();
-  Found found = SearchShares(shares, line, AsQuery(arguments), {begin, end - begin});
+  Found found = SearchShares(shares, line, AsQuery(arguments), {begin, end - begin}, asker);
   std::vector<Hit>& hits = found.hits;
   hits.resize(std::min(end - begin, hits.size()));
   hits.erase(hits.begin(), hits.begin() + static_cast<ptrdiff_t>(std::min(offset - begin, hits.size())));

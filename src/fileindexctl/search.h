@@ -25,6 +25,7 @@ struct Found {
   std::vector<Hit> hits = {};  // the best of each share
   uint64_t total = 0;
   bool total_is_exact = true;
+  bool total_is_least = false;  // where it is not exact: there are at least so many
   bool cut = false;             // not everything that may fit was looked at
   std::string suggestion = {};  // the line that was meant, perhaps; empty where nothing like it finds more
 };

@@ -84,7 +84,7 @@ void PrintHitsAsJson(const Found& found) {
 
 void PrintHits(const Found& found, size_t offset) {
   const std::vector<Hit>& hits = found.hits;
-  const char* about = found.total_is_exact ? "" : "about ";
+  const char* about = found.total_is_exact ? "" : found.total_is_least ? "at least " : "about ";
   if (!hits.empty()) PrintTableOf(hits);
   if (found.total == 0) {
     std::cout << "nothing found\n";

@@ -14,7 +14,7 @@ int main(int, char** argv) {
   sigemptyset(&signals);
   sigaddset(&signals, SIGTERM);
   pthread_sigmask(SIG_BLOCK, &signals, nullptr);
-  const auto echo = [](const std::string& request, Answer& answer, const Server::MakeWay& make_way) {
+  const auto echo = [](int, const std::string& request, Answer& answer, const Server::MakeWay& make_way) {
     make_way();
     const long number = request.size() > 4 ? atol(request.c_str() + 4) : 0;
     if (request.starts_with("wait")) sleep(static_cast<unsigned int>(number));

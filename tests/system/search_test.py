@@ -185,7 +185,6 @@ class SearchTest(unittest.TestCase):
         while json.loads((ETC / "fileindex.status").read_text())["share"]["docs"] != 0:
             time.sleep(0.01)
 
-    @unittest.skipIf(os.geteuid() != 0 or "4294967295" not in open("/proc/self/uid_map").read(), "needs another user")
     @unittest.skipIf("4294967295" not in pathlib.Path("/proc/self/uid_map").read_text(), "another user needs root")
     def test_another_user_reaches_neither_the_index_nor_the_daemons(self):
         index = next((QUEUE.parent / "db").rglob("*.glass"))
@@ -193,8 +192,8 @@ class SearchTest(unittest.TestCase):
         for options in {"user": 65534, "group": 65534, "extra_groups": []}, {}:
             reached = [subprocess.run(command, capture_output=True, **options).returncode == 0 for command in (
                 ["cat", index], ["python3", "-c", connect, "/run/vexoelasticd.sock"],
-                ["python3", "-c", connect, "/run/fileindexd.sock"], [os.environ["FILEINDEXCTL"], "search", "alpha"])]
-            self.assertEqual(reached, [not options] * 4)
+                ["python3", "-c", connect, "/run/fileindexd.sock"])]
+            self.assertEqual(reached, [not options] * 3)
 
 
 if __name__ == "__main__":

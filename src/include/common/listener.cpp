@@ -30,9 +30,9 @@ UniqueFd LockAlone(const std::string& path, const std::string& daemon) {
 
 }  // namespace
 
-DaemonListener::DaemonListener(const std::string& path, gid_t group, const std::string& daemon)
+DaemonListener::DaemonListener(const std::string& path, gid_t group, const std::string& daemon, Audience audience)
     : path_(path), lock_(LockAlone(path + ".lock", daemon)) {
-  Listen(group);
+  Listen(group, audience == Audience::kEverybody ? 0666 : 0660);
 }
 
 DaemonListener::~DaemonListener() {
@@ -40,7 +40,7 @@ DaemonListener::~DaemonListener() {
 }
 
 // The socket listens before it takes its place, so that nobody who connects is turned away in between.
-void DaemonListener::Listen(gid_t group) {
+void DaemonListener::Listen(gid_t group, mode_t mode) {
   const std::string fresh = path_ + ".new";
   sockaddr_un address = {};
   address.sun_family = AF_UNIX;
@@ -53,7 +53,7 @@ void DaemonListener::Listen(gid_t group) {
   if (bind(listening.get(), generic, sizeof(address)) != 0) Fail("bind " + fresh);
   constexpr auto kSame = static_cast<uid_t>(-1);
   if (chown(fresh.c_str(), kSame, group) != 0) QUARROX_LOG_FAILURE("chown %s failed", fresh.c_str());
-  if (chmod(fresh.c_str(), 0660) != 0) Fail("chmod " + fresh);
+  if (chmod(fresh.c_str(), mode) != 0) Fail("chmod " + fresh);
   if (listen(listening.get(), SOMAXCONN) != 0) Fail("listen");
   if (rename(fresh.c_str(), path_.c_str()) != 0) Fail("rename " + fresh);
   socket_ = std::move(listening);

@@ -14,9 +14,12 @@ namespace quarrox {
 // socket that a dead daemon left is replaced and a living one's never. Not thread-safe.
 class QUARROX_API DaemonListener {
  public:
-  // Listens at `path`, mode 0660, given to `group` (-1: the caller's own). `daemon` is the name that another one is
-  // called in messages. Throws Error 502 where another one listens or the socket cannot be made; not logged.
-  DaemonListener(const std::string& path, gid_t group, const std::string& daemon);
+  // Who may connect: the owner and a group, mode 0660, or everybody, mode 0666.
+  enum class Audience { kGroup, kEverybody };
+
+  // Listens at `path`, given to `group` (-1: the caller's own). `daemon` is the name that another one is called in
+  // messages. Throws Error 502 where another one listens or the socket cannot be made; not logged.
+  DaemonListener(const std::string& path, gid_t group, const std::string& daemon, Audience audience = Audience::kGroup);
 
   // Stops as Close() does, and lets go of the lock.
   ~DaemonListener();
@@ -37,7 +40,7 @@ class QUARROX_API DaemonListener {
   void Close();
 
  private:
-  void Listen(gid_t group);
+  void Listen(gid_t group, mode_t mode);
 
   const std::string path_;
   UniqueFd lock_;

@@ -1,0 +1,98 @@
+#include "readable.h"
+
+#include <charconv>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "error_code.h"
+
+namespace quarrox::elasticd {
+namespace {
+
+constexpr char kPrivilegeField[] = "VEXOMDPrivilege";  // the mode in octal digits
+constexpr char kOwnerField[] = "VEXOMDOwnerUserID";
+constexpr char kSizeField[] = "VEXOMDFSSize";
+constexpr char kChangedField[] = "VEXOMDFSContentChangeDate";
+
+// An access list shows its mask in the mode's bits for the group: where these let nobody read, neither does the list.
+constexpr unsigned int kOthersMayRead = S_IRGRP | S_IROTH;
+
+Field Needed(const Mapping& mapping, const char* name) {
+  const Field* field = mapping.Find(name);
+  if (field == nullptr) {
+    throw Error(kBadArgument, std::string("The index does not keep ") + name + ", which tells who may read a file");
+  }
+  return *field;
+}
+
+}  // namespace
+
+ReadableOnly::ReadableOnly(const Reader& reader, const Places& places, const Mapping& mapping, const Identity& user)
+    : reader_(reader),
+      places_(places),
+      privilege_(Needed(mapping, kPrivilegeField)),
+      owner_(Needed(mapping, kOwnerField)),
+      size_(Needed(mapping, kSizeField)),
+      changed_(Needed(mapping, kChangedField)),
+      user_(user.user),
+      view_(user) {}
+
+// The look comes first among the checks: what others look at then, and count, is readable.
+Query ReadableOnly::Restrict(Query query) {
+  Query look{Query::kCheck};
+  look.check = [this](DocumentId id) { return IsReadable(id); };
+  std::vector<Query> parts;
+  parts.push_back(std::move(look));
+  parts.push_back(Query::Of(Query::kFilter, {MayBeRead()}));
+  parts.push_back(std::move(query));
+  return Query::Of(Query::kAnd, std::move(parts));
+}
+
+// By the modes that documents have, of which there are few. This lets through too much and never too little, and saves
+// looks at what is nobody's but its owner's.
+Query ReadableOnly::MayBeRead() const {
+  const std::string prefix = PrefixOf(privilege_);
+  std::vector<Query> open;
+  std::vector<Query> of_owner;
+  for (const std::string& term : reader_.Terms(prefix)) {
+    const std::string_view digits = std::string_view(term).substr(prefix.size());
+    unsigned int mode = 0;
+    std::from_chars(digits.data(), digits.data() + digits.size(), mode, 8);
+    if ((mode & kOthersMayRead) != 0) {
+      open.push_back(Query::Term(term));
+    } else if ((mode & S_IRUSR) != 0) {
+      of_owner.push_back(Query::Term(term));
+    }
+  }
+  open.push_back(Query::Of(Query::kAnd, {Query::Term(ExactTerm(owner_, std::to_string(user_))),
+                                         Query::Of(Query::kOr, std::move(of_owner))}));
+  return Query::Of(Query::kOr, std::move(open));
+}
+
+bool ReadableOnly::IsReadable(DocumentId id) {
+  const std::string packed = reader_.Place(id);
+  if (packed.empty()) return false;
+  const Place place = UnpackPlace(packed);
+  const std::string directory = places_.DirectoryPath(place.directory);
+  if (!MayEnter(place.directory, directory)) return false;
+  const std::optional<struct stat> info = view_.Look(directory + '/' + place.name);
+  return info && IsKnownAs(id, *info);
+}
+
+// Directories that are closed to a user often have many documents.
+bool ReadableOnly::MayEnter(DirectoryId directory, const std::string& path) {
+  const auto [known, is_new] = entered_.try_emplace(directory, false);
+  if (is_new) known->second = view_.MayEnter(path);
+  return known->second;
+}
+
+// A directory has no words but its name, and its size and time change with everything in it.
+bool ReadableOnly::IsKnownAs(DocumentId id, const struct stat& info) const {
+  if (!reader_.Has(id, ExactTerm(owner_, std::to_string(info.st_uid)))) return false;
+  if (S_ISDIR(info.st_mode)) return true;
+  return reader_.Number(id, size_.number) == static_cast<double>(info.st_size) &&
+         reader_.Number(id, changed_.number) == static_cast<double>(info.st_mtim.tv_sec);
+}
+
+}  // namespace quarrox::elasticd

@@ -1,0 +1,45 @@
+// Leaves out of a search what a user may not read.
+#pragma once
+
+#include <string>
+#include <unordered_map>
+
+#include "analysis.h"
+#include "database.h"
+#include "mapping.h"
+#include "places.h"
+#include "query.h"
+#include "user_view.h"
+
+namespace quarrox::elasticd {
+
+// A document is found where the index does not rule out that the user may read its file, the user may read it now, and
+// the file is the one that the index knows: the same owner, size and time of change. Else whoever may write to a
+// directory could put a file of their own in the place of one that they may not read, and be shown that one's words.
+// One search, one thread. Looks into the reader and the places for as long as they are good.
+class ReadableOnly {
+ public:
+  // Throws Error 612 where the index does not keep what is needed, or the process may not act as the user.
+  ReadableOnly(const Reader& reader, const Places& places, const Mapping& mapping, const Identity& user);
+
+  // The query, for this user. The object has to live as long as what is returned.
+  Query Restrict(Query query);
+
+ private:
+  Query MayBeRead() const;
+  bool IsReadable(DocumentId id);
+  bool MayEnter(DirectoryId directory, const std::string& path);
+  bool IsKnownAs(DocumentId id, const struct stat& info) const;
+
+  const Reader& reader_;
+  const Places& places_;
+  const Field privilege_;
+  const Field owner_;
+  const Field size_;
+  const Field changed_;
+  const uid_t user_;
+  const UserView view_;
+  std::unordered_map<DirectoryId, bool> entered_;  // whether the user may enter a directory
+};
+
+}  // namespace quarrox::elasticd
