@@ -1,3 +1,4 @@
+#include <cstdio>
 #include <cstdlib>
 #include <ctime>
 #include <random>
@@ -203,6 +204,56 @@ TEST_F(SearchTest, NoLineTakesLongOrMuch) {
   }
   EXPECT_TRUE(Ask("w*")["cut"].asBool());
   EXPECT_FALSE(Ask("w11*").isMember("cut"));
+}
+
+TEST_F(SearchTest, AnOddLineIsAnsweredOrRefusedAtAColumnThatItHas) {
+  const std::string pieces[] = {"\"",
+                                "(",
+                                ")",
+                                " ",
+                                "-",
+                                "*",
+                                "\\",
+                                ":",
+                                "OR ",
+                                "AND ",
+                                "NOT ",
+                                "name:",
+                                "size:>",
+                                "date:",
+                                "path:/",
+                                "type:",
+                                "ext:",
+                                "..",
+                                ",",
+                                "1",
+                                "k",
+                                "one",
+                                "\xc3\xa9",
+                                "\xff",
+                                "\xe6\x97",
+                                "\x01",
+                                "\x1b[",
+                                "\n",
+                                std::string(1, '\0'),
+                                "\xe6\x97\xa5\xe6\x9c\xac",
+                                "2024-",
+                                "/"};
+  Write("one.txt", "one \xe6\x97\xa5\xe6\x9c\xac 1");
+  index_.Commit();
+  std::mt19937 random(7);
+  int answered = 0;
+  for (int round = 0; round < 1000; ++round) {
+    std::string line;
+    for (size_t left = 1 + random() % 30; left > 0; --left) line += pieces[random() % std::size(pieces)];
+    const std::string refusal = Refusal(line);
+    unsigned long column = 0;
+    if (refusal == "none" && ++answered > 0) continue;
+    ASSERT_EQ(sscanf(refusal.c_str(), "column %lu: ", &column), 1) << line << '\n' << refusal;
+    ASSERT_TRUE(column >= 1 && column <= line.size() + 1) << line << '\n' << refusal;
+  }
+  EXPECT_GT(answered, 20);
+  EXPECT_LT(answered, 980);
 }
 
 TEST_F(SearchTest, NamesThatMatchComeFirst) {
