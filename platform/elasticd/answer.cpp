@@ -57,8 +57,9 @@ void Answer::FlushTail() {
 }
 
 void Answer::Append(std::string_view text) {
-  if (text.size() > kLongest - size_) {
-    throw Error(kBadArgument, "The answer is longer than 4 GiB; ask for less at a time, with \"from\" and \"size\"");
+  if (text.size() > longest_ - std::min(longest_, size_)) {
+    throw Error(kBadArgument, "The answer is longer than " + std::to_string(longest_ >> 20) +
+                                  " MiB; ask for less at a time, with \"from\" and \"size\"");
   }
   if (spooled_ == 0 && tail_.empty() && memory_.size() + text.size() <= kInMemory) {
     memory_ += text;

@@ -25,6 +25,9 @@ class Answer {
   // answer is then as it was. Not logged.
   void Append(std::string_view text);
 
+  // From now on refuses to grow past `longest` bytes, with 612 as well.
+  void Limit(uint64_t longest) { longest_ = longest; }
+
   // Forgets everything, or what came after the first `size` bytes.
   void Clear();
   void Cut(uint64_t size);
@@ -49,6 +52,7 @@ class Answer {
   uint64_t spooled_ = 0;  // the file's size
   std::string tail_;      // what follows the file
   uint64_t size_ = 0;
+  uint64_t longest_ = kLongest;
 };
 
 }  // namespace quarrox::elasticd

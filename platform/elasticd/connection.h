@@ -6,6 +6,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <string>
 #include <utility>
 
@@ -64,7 +65,8 @@ struct Connection {
   Clock::time_point deadline = {};
   size_t reserved = 0;  // bytes of the memory for requests
   uint32_t index = 0;
-  uint32_t generation = 0;  // tells it from others that had its place before
+  std::optional<uid_t> user;  // whose it is, where that is counted
+  uint32_t generation = 0;    // tells it from others that had its place before
   Connection* previous = nullptr;
   Connection* next = nullptr;
 };

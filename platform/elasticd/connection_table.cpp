@@ -84,7 +84,13 @@ void ConnectionTable::Unlink(Connection& connection) {
   connection.listed = false;
 }
 
-Connection* ConnectionTable::Admit(UniqueFd& fd) {
+int ConnectionTable::CountOf(uid_t user) const {
+  const std::lock_guard lock(mutex_);
+  const auto found = users_.find(user);
+  return found == users_.end() ? 0 : found->second;
+}
+
+Connection* ConnectionTable::Admit(UniqueFd& fd, std::optional<uid_t> user) {
   const std::lock_guard lock(mutex_);
   if (count_ >= most_) return nullptr;
   if (free_.empty()) {
@@ -97,6 +103,8 @@ Connection* ConnectionTable::Admit(UniqueFd& fd) {
   connection.fd = std::move(fd);
   connection.stage = Stage::kIdle;
   connection.answers = 0;
+  connection.user = user;
+  if (user) ++users_[*user];
   return Own(connection);
 }
 
@@ -201,6 +209,7 @@ void ConnectionTable::Release(Connection& connection) {
   connection.owned = connection.registered = false;
   ++connection.generation;
   free_.push_back(connection.index);
+  if (connection.user && --users_[*connection.user] == 0) users_.erase(*connection.user);
   --count_;
   EndIfEmpty();
 }

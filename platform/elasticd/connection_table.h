@@ -6,7 +6,9 @@
 #pragma once
 
 #include <deque>
+#include <map>
 #include <mutex>
+#include <optional>
 #include <vector>
 
 #include "connection.h"
@@ -34,8 +36,10 @@ class ConnectionTable {
   // Registers with `epoll`, which lives longer. Holds `most` connections. Throws Error 502.
   ConnectionTable(int epoll, size_t most);
 
-  // A new connection for the caller, which takes `fd`; null where the table is full.
-  Connection* Admit(UniqueFd& fd);
+  // A new connection for the caller, which takes `fd`; null where the table is full. Where a user is named, the
+  // connection counts among theirs.
+  Connection* Admit(UniqueFd& fd, std::optional<uid_t> user = std::nullopt);
+  int CountOf(uid_t user) const;
 
   // The connection that an event is about; null where another thread has it or it is gone.
   Connection* Take(uint64_t token);
@@ -108,6 +112,7 @@ class ConnectionTable {
   std::deque<Connection> places_;
   std::vector<uint32_t> free_;
   size_t count_ = 0;
+  std::map<uid_t, int> users_;  // the connections of each
   std::atomic<int> leaving_ = 0;
   List lists_[static_cast<size_t>(Stage::kStages)];
   Clock::time_point timer_at_ = Clock::time_point::max();

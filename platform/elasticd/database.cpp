@@ -110,6 +110,12 @@ Xapian::doccount Bound(uint64_t number, uint64_t bound) {
   return static_cast<Xapian::doccount>(std::min(number, bound));
 }
 
+// So many hits are counted one by one.
+uint64_t AllCounted(const SearchOptions& options) {
+  const uint64_t wanted = options.from + std::min(options.size, ~uint64_t{0} - options.from);
+  return std::max(kCountedHits, wanted);
+}
+
 }  // namespace
 
 // Keys are written in order and all at once, before a commit: the tree on disk then grows by full blocks, not by
@@ -285,7 +291,8 @@ SearchResult Reader::Search(Query query, const SearchOptions& options) const {
     }
     result.total = options.discreet ? found.get_matches_lower_bound() : found.get_matches_estimated();
     result.cut = converter.cut();
-    result.exact = found.get_matches_lower_bound() == found.get_matches_upper_bound();
+    result.exact = options.discreet ? result.total < AllCounted(options)
+                                    : found.get_matches_lower_bound() == found.get_matches_upper_bound();
     return result;
   });
 }
@@ -314,6 +321,13 @@ double Reader::Number(DocumentId id, unsigned int field) const {
     const std::string value =
         impl_->database.get_document(id, Xapian::DOC_ASSUME_VALID).get_value(kFirstNumberSlot + field);
     return value.empty() ? std::numeric_limits<double>::quiet_NaN() : Xapian::sortable_unserialise(value);
+  });
+}
+
+void Reader::ForEachSuggestion(const std::function<void(const std::string& word)>& take) const {
+  Guard([&] {
+    const Xapian::TermIterator end = impl_->database.spellings_end();
+    for (Xapian::TermIterator word = impl_->database.spellings_begin(); word != end; ++word) take(*word);
   });
 }
 

@@ -142,7 +142,10 @@ class Reader final : public Store {
   // A document's number in a field; NaN where it has none.
   double Number(DocumentId id, unsigned int field) const;
 
-  // The word among the suggestions that is most like another one; empty where none is. Documents need not have it.
+  // Hands out the words among the suggestions. Documents need not have them.
+  void ForEachSuggestion(const std::function<void(const std::string& word)>& take) const;
+
+  // The word among the suggestions that is most like another one; empty where none is.
   std::string Suggestion(const std::string& word) const;
 
  private:

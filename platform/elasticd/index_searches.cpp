@@ -9,6 +9,7 @@
 #include "query_parser.h"
 #include "readable.h"
 #include "snippet.h"
+#include "spelling.h"
 
 namespace quarrox::elasticd {
 namespace {
@@ -25,11 +26,18 @@ constexpr uint64_t kLittle = 3;
 // A word that some documents have was meant all the same, unless so many times more have another one.
 constexpr uint64_t kMuchMore = 10;
 
+// For users all words of the dictionary are looked at for each of these.
+constexpr size_t kMostGuessed = 4;
+
+// More keys than anybody sorts by.
+constexpr Json::ArrayIndex kMostKeys = 16;
+
 // A search that meets commit after commit is tried again so often.
 constexpr int kMostRefreshes = 20;
 
 std::vector<std::pair<unsigned int, bool>> ParseSort(const Mapping& mapping, const Json::Value& sort) {
   std::vector<std::pair<unsigned int, bool>> keys;
+  if (sort.size() > kMostKeys) throw Error(kBadQuery, "sort takes " + std::to_string(kMostKeys) + " fields at most");
   for (const Json::Value& key : sort) {
     const bool is_object = key.isObject() && key.size() == 1;
     const std::string name = is_object ? key.begin().name() : key.isString() ? key.asString() : std::string();
@@ -149,6 +157,9 @@ class Question {
 
   SearchResult Ask() { return Search(parser_.Parse(request_.qsl), options_); }
 
+  // Whether a hit may be told of; it may have changed, as may the file, since it was found.
+  bool MayShow(const Hit& hit) { return !readable_ || readable_->IsReadable(hit.id); }
+
   const std::vector<LineWord>& words() const { return parser_.line_words(); }
   bool cut() const { return parser_.cut(); }
 
@@ -158,11 +169,11 @@ class Question {
     const std::vector<LineWord> words = parser_.first_line_words();
     Json::Value qsl = request_.qsl;
     Json::Value* const line = FindLine(qsl);
-    if (line == nullptr) return {};
+    if (line == nullptr || (readable_ && words.size() > kMostGuessed)) return {};
     std::string changed = line->asString();
     for (auto word = words.rbegin(); word != words.rend(); ++word) {
       if (word->pieces.size() != 1 || word->pieces.front().ideographs || word->beginning) continue;
-      const std::string meant = reader_.Suggestion(word->pieces.front().text);
+      const std::string meant = Meant(word->pieces.front().text);
       if (meant.empty() || CountWith(meant) <= CountWith(word->pieces.front().text) * kMuchMore) continue;
       const bool quoted = changed[word->begin] == '"';
       changed.replace(word->begin, word->end - word->begin, quoted ? '"' + meant + '"' : meant);
@@ -173,6 +184,23 @@ class Question {
   }
 
  private:
+  // The word that was meant, perhaps. For a user it is sought among the words of what they may read: that there is none
+  // because another word is nearer would tell of that one.
+  std::string Meant(const std::string& word) const {
+    if (!readable_) return reader_.Suggestion(word);
+    std::string best;
+    uint64_t most = 0;
+    for (const std::vector<std::string>& near : FindNear(reader_, word)) {
+      for (const std::string& candidate : near) {
+        const uint64_t count = CountWith(candidate);
+        if (count > most) best = candidate;
+        most = std::max(most, count);
+      }
+      if (most > 0) break;
+    }
+    return best;
+  }
+
   SearchOptions JustCount() const { return {0, 0, {}, options_.discreet}; }
 
   SearchResult Search(Query query, const SearchOptions& options) const {
@@ -225,7 +253,8 @@ void Index::SearchCommitted(const SearchRequest& request, Answer& answer) {
   answer.Append("[");
   bool first = true;
   for (const Hit& hit : result.hits) {
-    const Json::Value fields = Retry(reader, places, [&] { return writer.Show(hit); });
+    const Json::Value fields =
+        Retry(reader, places, [&] { return question.MayShow(hit) ? writer.Show(hit) : Json::Value(); });
     if (!fields.isNull()) AppendElement(answer, first, fields);
   }
   answer.Append("],\"total\":" + std::to_string(result.total));

@@ -115,19 +115,23 @@ std::vector<NamePattern> ComponentPatterns(const LineNode& node) {
 
 }  // namespace
 
-LineQuery::LineQuery(const Mapping& mapping, const Store& store, const Places& places, LineSettings settings)
+std::shared_ptr<size_t> LineBudget::MostLooks() {
+  return std::make_shared<size_t>(kMostLooks);
+}
+
+LineQuery::LineQuery(const Mapping& mapping, const Store& store, const Places& places, LineSettings settings,
+                     LineBudget& budget)
     : mapping_(mapping),
       store_(store),
       places_(places),
       settings_(std::move(settings)),
       prefixes_(PrefixesOfAll(mapping)),
-      left_(std::make_shared<size_t>(kMostLooks)) {}
+      budget_(budget),
+      left_(budget.looks) {}
 
 Query LineQuery::Make(std::string_view line) {
   line_ = line;
   words_.clear();
-  word_count_ = 0;
-  *left_ = kMostLooks;
   Query query = Of(ReadLine(line), true);
   return SaysNothing(query) ? Query{Query::kNothing} : query;
 }
@@ -198,8 +202,8 @@ Query LineQuery::Text(const LineNode& node, bool wanted) {
   LineWord found{PiecesOf(text), beginning, node.begin, node.end};
   // What has a letter and still no word is longer than any word that is indexed.
   if (found.pieces.empty()) return HasWordCharacter(text) ? Query{Query::kNothing} : NothingSaid();
-  word_count_ += WordsOf(found.pieces).size();
-  if (word_count_ > kMostWords)
+  budget_.words += WordsOf(found.pieces).size();
+  if (budget_.words > kMostWords)
     FailAt(line_, node.begin, "there are more than " + std::to_string(kMostWords) + " words");
   Query query = Words(found.pieces, beginning);
   if (wanted) words_.push_back(std::move(found));
@@ -326,7 +330,7 @@ Query LineQuery::ByDate(const LineNode& node) const {
 }
 
 Query LineQuery::ByPath(const LineNode& node) {
-  if (++paths_ > kMostPaths) FailAt(line_, node.begin, "over " + std::to_string(kMostPaths) + " paths");
+  if (++budget_.paths > kMostPaths) FailAt(line_, node.begin, "over " + std::to_string(kMostPaths) + " paths");
   const bool from_root = node.text.starts_with('/');
   const std::vector<NamePattern> patterns = ComponentPatterns(node);
   if (patterns.empty()) return from_root ? Query{Query::kEverything} : Query{Query::kNothing};

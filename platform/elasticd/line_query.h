@@ -33,11 +33,20 @@ struct LineWord {
   size_t end = 0;
 };
 
+// What the lines of one query may cost together.
+struct LineBudget {
+  size_t words = 0;                             // so far, with those that must not be there
+  size_t paths = 0;                             // conditions on paths
+  std::shared_ptr<size_t> looks = MostLooks();  // so many documents may yet be looked at
+  static std::shared_ptr<size_t> MostLooks();
+};
+
 // Paths are looked up while a query is made, so it is good for what the places then hold. What it returns looks into
 // the store, too, and is good for as long as that.
 class LineQuery {
  public:
-  LineQuery(const Mapping& mapping, const Store& store, const Places& places, LineSettings settings);
+  LineQuery(const Mapping& mapping, const Store& store, const Places& places, LineSettings settings,
+            LineBudget& budget);
 
   // Throws Error 613 that says what cannot be read, and in which column; not logged.
   Query Make(std::string_view line);
@@ -75,9 +84,8 @@ class LineQuery {
   const std::vector<std::string> prefixes_;
   std::string_view line_;
   std::vector<LineWord> words_;
-  size_t word_count_ = 0;         // with those that must not be there
-  size_t paths_ = 0;              // conditions on paths
-  std::shared_ptr<size_t> left_;  // so many documents may yet be looked at
+  LineBudget& budget_;
+  const std::shared_ptr<size_t> left_;  // of the budget; a query goes on with it when this object is gone
 };
 
 }  // namespace quarrox::elasticd

@@ -21,6 +21,7 @@ constexpr int kDeepest = 32;
 
 // Each costs a look-up at least.
 constexpr size_t kMostWords = 256;
+constexpr size_t kMostParts = 1024;
 
 [[noreturn]] void Fail(const std::string& reason) {
   throw Error(kBadQuery, reason);
@@ -102,12 +103,15 @@ Query InDirectories(std::unordered_set<DirectoryId> directories, std::string_vie
 
 Query QueryParser::Parse(const Json::Value& qsl) {
   lines_.clear();
+  budget_ = LineBudget();
+  parts_ = 0;
   line_words_.clear();
   first_line_words_.clear();
   return ParseAt(qsl, 0);
 }
 
 Query QueryParser::ParseAt(const Json::Value& qsl, int depth) {
+  if (++parts_ > kMostParts) Fail("The query has more than " + std::to_string(kMostParts) + " parts");
   if (depth > kDeepest) Fail("The query is nested more than " + std::to_string(kDeepest) + " levels deep");
   const Member query = OnlyMember(qsl, "A query");
   if (query.name == "bool") return Bool(query.value, depth);
@@ -273,7 +277,7 @@ Query QueryParser::Line(const Json::Value& value) {
   for (auto type = types.begin(); type != types.end(); ++type) {
     for (const Json::Value& extension : *type) settings.types[type.name()].push_back(Text("types", extension));
   }
-  LineQuery& made = lines_.emplace_back(mapping_, store_, places_, std::move(settings));
+  LineQuery& made = lines_.emplace_back(mapping_, store_, places_, std::move(settings), budget_);
   Query query = made.Make(line);
   line_words_.insert(line_words_.end(), made.words().begin(), made.words().end());
   if (lines_.size() == 1) first_line_words_ = line_words_;

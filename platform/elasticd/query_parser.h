@@ -58,6 +58,8 @@ class QueryParser {
   const Store& store_;
   const Places& places_;
   std::deque<LineQuery> lines_;  // of the last query, which refers to them
+  LineBudget budget_;
+  size_t parts_ = 0;
   std::vector<LineWord> line_words_;
   std::vector<LineWord> first_line_words_;
 };

@@ -14,6 +14,10 @@ constexpr char kPrivilegeField[] = "VEXOMDPrivilege";  // the mode in octal digi
 constexpr char kOwnerField[] = "VEXOMDOwnerUserID";
 constexpr char kSizeField[] = "VEXOMDFSSize";
 constexpr char kChangedField[] = "VEXOMDFSContentChangeDate";
+constexpr char kIsDirectoryField[] = "VEXOMDIsDir";
+
+// A million looks take some seconds. Searches of others in the same index wait meanwhile.
+constexpr std::chrono::seconds kLongest(10);
 
 // An access list shows its mask in the mode's bits for the group: where these let nobody read, neither does the list.
 constexpr unsigned int kOthersMayRead = S_IRGRP | S_IROTH;
@@ -35,13 +39,29 @@ ReadableOnly::ReadableOnly(const Reader& reader, const Places& places, const Map
       owner_(Needed(mapping, kOwnerField)),
       size_(Needed(mapping, kSizeField)),
       changed_(Needed(mapping, kChangedField)),
+      is_directory_(Needed(mapping, kIsDirectoryField)),
       user_(user.user),
-      view_(user) {}
+      view_(user),
+      end_(std::chrono::steady_clock::now() + kLongest) {}
 
-// The look comes first among the checks: what others look at then, and count, is readable.
+// What other checks look at counts, and too many end a search early, which is told: so they look at what is readable
+// only, wherever they stand.
+void ReadableOnly::LookBeforeChecks(Query& query) {
+  std::vector<Query*> left = {&query};
+  while (!left.empty()) {
+    Query& part = *left.back();
+    left.pop_back();
+    if (part.kind == Query::kCheck) {
+      part.check = [this, then = std::move(part.check)](DocumentId id) { return WasReadable(id) && then(id); };
+    }
+    for (Query& inner : part.parts) left.push_back(&inner);
+  }
+}
+
 Query ReadableOnly::Restrict(Query query) {
+  LookBeforeChecks(query);
   Query look{Query::kCheck};
-  look.check = [this](DocumentId id) { return IsReadable(id); };
+  look.check = [this](DocumentId id) { return WasReadable(id); };
   std::vector<Query> parts;
   parts.push_back(std::move(look));
   parts.push_back(Query::Of(Query::kFilter, {MayBeRead()}));
@@ -70,7 +90,21 @@ Query ReadableOnly::MayBeRead() const {
   return Query::Of(Query::kOr, std::move(open));
 }
 
+bool ReadableOnly::WasReadable(DocumentId id) {
+  if (id != last_) last_was_readable_ = IsReadable(id);
+  last_ = id;
+  return last_was_readable_;
+}
+
 bool ReadableOnly::IsReadable(DocumentId id) {
+  if (std::chrono::steady_clock::now() > end_) {
+    throw Error(kBadQuery, "The search fits too much to look at in " + std::to_string(kLongest.count()) +
+                               " seconds; more letters or words make it shorter");
+  }
+  return Look(id);
+}
+
+bool ReadableOnly::Look(DocumentId id) {
   const std::string packed = reader_.Place(id);
   if (packed.empty()) return false;
   const Place place = UnpackPlace(packed);
@@ -90,7 +124,9 @@ bool ReadableOnly::MayEnter(DirectoryId directory, const std::string& path) {
 // A directory has no words but its name, and its size and time change with everything in it.
 bool ReadableOnly::IsKnownAs(DocumentId id, const struct stat& info) const {
   if (!reader_.Has(id, ExactTerm(owner_, std::to_string(info.st_uid)))) return false;
-  if (S_ISDIR(info.st_mode)) return true;
+  const bool is_directory = reader_.Number(id, is_directory_.number) == 1;
+  if (is_directory != S_ISDIR(info.st_mode)) return false;
+  if (is_directory) return true;
   return reader_.Number(id, size_.number) == static_cast<double>(info.st_size) &&
          reader_.Number(id, changed_.number) == static_cast<double>(info.st_mtim.tv_sec);
 }

@@ -1,6 +1,7 @@
 // Leaves out of a search what a user may not read.
 #pragma once
 
+#include <chrono>
 #include <string>
 #include <unordered_map>
 
@@ -25,9 +26,14 @@ class ReadableOnly {
   // The query, for this user. The object has to live as long as what is returned.
   Query Restrict(Query query);
 
+  // By a look now, at what the reader now knows. Throws Error 613 where all looks together have taken too long.
+  bool IsReadable(DocumentId id);
+
  private:
   Query MayBeRead() const;
-  bool IsReadable(DocumentId id);
+  void LookBeforeChecks(Query& query);
+  bool WasReadable(DocumentId id);
+  bool Look(DocumentId id);
   bool MayEnter(DirectoryId directory, const std::string& path);
   bool IsKnownAs(DocumentId id, const struct stat& info) const;
 
@@ -37,8 +43,12 @@ class ReadableOnly {
   const Field owner_;
   const Field size_;
   const Field changed_;
+  const Field is_directory_;
   const uid_t user_;
   const UserView view_;
+  const std::chrono::steady_clock::time_point end_;
+  DocumentId last_ = 0;  // the one that was looked at last, which several checks may ask for
+  bool last_was_readable_ = false;
   std::unordered_map<DirectoryId, bool> entered_;  // whether the user may enter a directory
 };
 

@@ -35,7 +35,10 @@ constexpr size_t kMostConnections = 16384;
 constexpr size_t kMostConnectionsOfAll = 256;
 
 // The longest request of anybody: a person's line with what goes along takes far less.
-constexpr size_t kLongestOfAll = size_t{1} << 20;
+constexpr size_t kLongestOfAll = size_t{64} << 10;
+
+// Of anybody's connections those of one user, so that no user keeps all others out.
+constexpr int kMostOfOneUser = 16;
 
 // Files of the engine itself.
 constexpr size_t kOtherDescriptors = 512;
@@ -236,14 +239,23 @@ void Server::Impl::Accept(Worker& worker, uint64_t& duty) {
 }
 
 void Server::Impl::Welcome(Worker& worker, UniqueFd& client) {
-  Connection* connection = table.Admit(client);
+  std::optional<uid_t> user;
+  if (settings.for_everybody) {
+    const std::optional<Identity> peer = IdentityOfPeer(client.get());
+    if (!peer) return worker.SendRefusal(client.get(), "The system does not tell who asks");
+    user = peer->user;
+    if (table.CountOf(*user) >= kMostOfOneUser) {
+      return worker.SendRefusal(client.get(), "Too many connections of this user are open; ask again later");
+    }
+  }
+  Connection* connection = table.Admit(client, user);
   if (connection == nullptr) {
     const char* const full = "Too many clients are connected; ask again later";
     Connection* silent = table.TakeSilent();
     worker.SendRefusal(silent != nullptr ? silent->fd.get() : client.get(), full);
     if (silent == nullptr) return;
     table.Release(*silent);
-    connection = table.Admit(client);
+    connection = table.Admit(client, user);
     if (connection == nullptr) return worker.SendRefusal(client.get(), full);
   }
   if (settings.for_everybody || rights.MayCommand(connection->fd.get())) return worker.Serve(*connection);

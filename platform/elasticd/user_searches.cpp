@@ -10,6 +10,9 @@ namespace {
 constexpr int kMostOfOne = 2;
 constexpr int kMostOfAll = 32;
 
+// What is not read waits on the disk: a page of hits is far less, and the longest list of them some megabytes.
+constexpr uint64_t kLongestAnswer = uint64_t{8} << 20;
+
 }  // namespace
 
 // Counts a search while it runs. Throws Error 1401 where there are too many.
@@ -39,6 +42,7 @@ class UserSearches::Turn {
 };
 
 void UserSearches::Handle(int client, const std::string& request, Answer& answer) {
+  answer.Limit(kLongestAnswer);
   try {
     const std::optional<Identity> user = IdentityOfPeer(client);
     if (!user) throw Error(kInputOutput, "The system does not tell who asks");

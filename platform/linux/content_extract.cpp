@@ -23,17 +23,20 @@ namespace {
 // The unit of statx's stx_blocks, whatever the file system's own block is.
 constexpr unsigned int kBlockSize = 512;
 
+struct statx Look(int fd) {
+  struct statx info;
+  constexpr unsigned int kWanted = STATX_BASIC_STATS | STATX_BTIME;
+  if (fd < 0 || statx(fd, "", AT_EMPTY_PATH | AT_NO_AUTOMOUNT, kWanted, &info) != 0) {
+    throw std::system_error(errno, std::generic_category());
+  }
+  return info;
+}
+
 struct statx Look(const std::string& path) {
   if (path.empty() || path.front() != '/' || path.find('\0') != std::string::npos) {
     throw std::invalid_argument("it has no absolute path");
   }
-  struct statx info;
-  constexpr unsigned int kWanted = STATX_BASIC_STATS | STATX_BTIME;
-  const quarrox::UniqueFd fd(quarrox::OpenWithoutLinks(path, O_PATH));
-  if (!fd || statx(fd.get(), "", AT_EMPTY_PATH | AT_NO_AUTOMOUNT, kWanted, &info) != 0) {
-    throw std::system_error(errno, std::generic_category());
-  }
-  return info;
+  return Look(quarrox::UniqueFd(quarrox::OpenWithoutLinks(path, O_PATH)).get());
 }
 
 const char* Kind(const struct statx& info) {
@@ -100,15 +103,16 @@ bool HasNotes(int fd) {
   return std::string_view(names, static_cast<size_t>(size) + 1).find(kOfUsers) != std::string_view::npos;
 }
 
-// Adds what is in a file. By now the path may name anything.
+// Adds what is in a file. By now the path may name anything, and what is read is to have its own attributes: who may
+// find a text is known by them.
 void ReadContents(const std::string& path, Json::Value& fields) {
   const quarrox::UniqueFd fd(OpenUnnoticed(path));
   if (!fd && HasNoContent(errno)) return;
-  struct stat info;
-  if (!fd || fstat(fd.get(), &info) != 0) throw std::system_error(errno, std::generic_category());
-  if (!S_ISREG(info.st_mode)) return;
+  const struct statx info = Look(fd.get());
+  if (!S_ISREG(info.stx_mode)) return;
+  SetAttributes(info, fields);
   const std::string extension = fields["VEXOMDExtension"].asString();
-  const auto size = static_cast<uint64_t>(info.st_size);
+  const uint64_t size = info.stx_size;
   const std::optional<std::string> text =
       !HasNotes(fd.get()) ? platform::ReadPlainText(fd.get(), size, extension) : std::optional<std::string>();
   if (text) {

@@ -40,6 +40,11 @@ QUARROX_API Json::Value ReaderFeatures();
 // Refreshes what the file system says of a file. Throws Error 917 where it has no document, 914 as IndexUpsert.
 QUARROX_API void IndexAttr(const std::string& share, const std::string& path);
 
+// As IndexAttr, and true, where the document says the same of the file's owner, size and time of change as the disk
+// does, or both are a directory's. Else false: another file may stand there by now, and the text in the document would
+// get that one's owner and rights. False too where there is no document. Throws Error 914 as IndexUpsert.
+QUARROX_API bool IndexAttrOfSame(const std::string& share, const std::string& path);
+
 // Deletes the document of a path; all documents below a directory, its own not included.
 QUARROX_API void IndexDel(const std::string& share, const std::string& path);
 QUARROX_API void IndexDelDir(const std::string& share, const std::string& path);

@@ -1,7 +1,9 @@
 #define QUARROX_LOG_UNIT "elastic_control"
 #include <cxxabi.h>
 
+#include <algorithm>
 #include <cerrno>
+#include <iterator>
 #include <new>
 #include <system_error>
 #include <utility>
@@ -163,6 +165,27 @@ void IndexUpsert(const std::string& share, const std::string& path, bool need_me
 void IndexAttr(const std::string& share, const std::string& path) {
   if (!IsDocumentExists(share, path)) throw Error(kErrEngineReply);
   SendElasticCommand(DocumentRequest("document_set_by_id", GetFileIndexID(share), path, BuildDocument(path, false)));
+}
+
+bool IndexAttrOfSame(const std::string& share, const std::string& path) {
+  constexpr const char* kIdentity[] = {"VEXOMDOwnerUserID", "VEXOMDFSSize", "VEXOMDFSContentChangeDate"};
+  constexpr const char* kIsDirectory = "VEXOMDIsDir";
+  Json::Value data = PathQuery(GetFileIndexID(share), "term", path);
+  for (const char* field : kIdentity) data["query"]["load_field"].append(field);
+  data["query"]["load_field"].append(kIsDirectory);
+  const Json::Value hits = GetByQuery(__func__, data);
+  if (hits.empty()) return false;
+  const Json::Value& known = hits[0];
+  Json::Value document = BuildDocument(path, false);
+  const bool is_directory = known[kIsDirectory] == true && document[kIsDirectory] == true;
+  const auto is_same = [&](const char* field) {
+    const Json::Value& now = document[field];
+    return now.isNumeric() ? known[field].isNumeric() && known[field].asDouble() == now.asDouble()
+                           : known[field] == now;
+  };
+  if (!is_directory && !std::all_of(std::begin(kIdentity), std::end(kIdentity), is_same)) return false;
+  SendElasticCommand(DocumentRequest("document_set_by_id", GetFileIndexID(share), path, std::move(document)));
+  return true;
 }
 
 void IndexDel(const std::string& share, const std::string& path) {

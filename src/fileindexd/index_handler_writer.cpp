@@ -122,7 +122,8 @@ void IndexWriter::Upsert(const std::string& path) {
 bool IndexWriter::RefreshAttributes(const std::string& path) {
   const std::optional<std::string> place = failures_.empty() ? std::nullopt : PlaceOf(path);
   if (place && failures_.Find(*place) != nullptr) return false;
-  if (Try([&] { elastic::IndexAttr(scope_.share(), path); })) return false;
+  bool is_same = false;
+  if (Try([&] { is_same = elastic::IndexAttrOfSame(scope_.share(), path); }) || !is_same) return false;
   Done(path);
   return true;
 }

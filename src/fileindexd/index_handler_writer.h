@@ -28,7 +28,7 @@ class IndexWriter {
   void Upsert(const std::string& path);
 
   // Refreshes what the file system says. False where the path is to be upserted instead: the index does not know it, or
-  // something failed there before.
+  // as another file, or something failed there before.
   bool RefreshAttributes(const std::string& path);
 
   void Delete(const std::string& path);

@@ -4,6 +4,7 @@ import json
 import os
 import pathlib
 import random
+import select
 import shutil
 import socket
 import struct
@@ -200,6 +201,35 @@ class PermissionTest(unittest.TestCase):
         self.assertEqual(as_user("u0", lambda: ask(own, qsl={"query_string": "x" * (2 << 20)}))["error"]["code"], 616)
         self.assertIn("denied", as_user("u0", lambda: ask("/run/vexoelasticd.sock", qsl={"query_string": "common"})))
 
+    def test_what_a_user_may_not_read_shows_in_nothing_that_is_told(self):
+        for number in range(100):
+            for kind in "csv", "md":
+                self.make(DOCS / ("n%d.%s" % (number, kind)), "common", 0, 0, 0o644)
+        self.make(DOCS / "own.txt", "blackbiryz zebra merger", 0, 0, 0o644)
+        self.make(DOCS / "hidden.csv", "blackbird merger zebra", 0, 0, 0o600)
+        self.serve()
+        self.assertEqual(machine.ctl("suggest", "rebuild")[0], 0)
+        self.assertEqual(line("blackbirx", suggest=True)["suggestion"], "blackbird")
+        self.assertEqual(line("blackbirx", "u0", suggest=True)["suggestion"], "blackbiryz")
+        told = [{key: line(text, "u0", size=1).get(key) for key in ("total", "exact", "at_least", "cut")} for text in ("ext:csv", "ext:md")]
+        self.assertEqual(told[0], told[1])
+        phrase = '"merger zebra" OR ' * 60 + "nothing"
+        self.assertEqual(line(phrase, "u0")["total"], 0)
+        own = "/run/vexosearch.sock"
+
+        def crowd():
+            clients = [socket.socket(socket.AF_UNIX) for _ in range(40)]
+            for client in clients:
+                client.connect(own)
+            time.sleep(0.3)
+            answered = len(select.select(clients, [], [], 0)[0])
+            return answered
+
+        self.assertEqual(as_user("u0", crowd), 24)
+        many = {"bool": {"should": [{"query_string": "path:*n*"}] * 20}}
+        self.assertEqual(as_user("u0", lambda: ask(own, qsl=many))["error"]["code"], 613)
+        self.assertEqual(as_user("u0", lambda: ask(own, qsl={"query_string": "common"}, sort=["VEXOMDFSSize"] * 20))["error"]["code"], 613)
+
     def test_what_was_put_in_the_place_of_another_file_shows_nothing_of_it(self):
         (DOCS / "all").mkdir()
         os.chmod(DOCS / "all", 0o777)
@@ -207,6 +237,9 @@ class PermissionTest(unittest.TestCase):
         for path in DOCS / "all/plan.txt", DOCS / "all/bobs/plan.txt":
             self.make(path, "common secret", USERS["u1"], GROUPS["g2"], 0o640)
         os.chown(DOCS / "all/bobs", USERS["u1"], USERS["u1"])
+        self.make(DOCS / "all/owned.txt", "common hoard", USERS["u1"], GROUPS["g2"], 0o600)
+        (DOCS / "all/public").mkdir()
+        os.chown(DOCS / "all/public", USERS["u1"], GROUPS["g2"])
         self.make(DOCS / "all/other.txt", "common second", USERS["u1"], GROUPS["g2"], 0o644)
         self.serve()
         seen = lambda text: sorted(hit["VEXOMDPath"] for hit in line(text, "u0")["data"])
@@ -227,10 +260,18 @@ class PermissionTest(unittest.TestCase):
 
         self.assertTrue(as_user("u0", swap))
         self.assertEqual(seen("secret"), [])
+        as_user("u0", lambda: (os.rename(DOCS / "all/owned.txt", DOCS / "all/kept.txt"), os.rename(DOCS / "all/public", DOCS / "all/owned.txt")))
+        self.assertEqual(seen("hoard"), [])
+        as_user("u0", lambda: (os.rename(DOCS / "all/owned.txt", DOCS / "all/public"), os.rename(DOCS / "all/kept.txt", DOCS / "all/owned.txt")))
         os.chmod(DOCS / "all/other.txt", 0o600)
         self.assertEqual(seen("second"), [])
         self.assertEqual(machine.ctl("resume")[0], 0)
         self.until([str(DOCS / "all/bobs/plan.txt"), str(DOCS / "all/plan.txt")], lambda: seen("sicret"))
+        with open(DOCS / "all/owned.txt", "w") as other:  # what is in the index is what was there before
+            (other.write("common public"), other.flush())
+            os.chmod(DOCS / "all/owned.txt", 0o644)
+            self.until([str(DOCS / "all/owned.txt")], lambda: seen("public ext:txt"))
+            self.assertEqual(seen("hoard"), [])
         os.chmod(DOCS / "all/other.txt", 0o644)
         self.until([str(DOCS / "all/other.txt")], lambda: seen("second"))
 
