@@ -33,7 +33,7 @@ import private_machine as machine
 SMALL, MEDIA = "--small" in sys.argv, "--media" in sys.argv
 FILES, RENAMED, CHANGED, TRIES, IDLE = (1200, 500, 20, 10, 5) if SMALL else (24000, 10000, 100, 100, 60)
 BUILD = pathlib.Path(os.environ.get("FILEINDEX_BUILD_DIR", "build/release")).resolve()
-ROOT = BUILD / "system_bench"
+ROOT = BUILD / (pathlib.Path(sys.argv[0]).stem + "_small" * SMALL)  # of the program that runs
 PROGRAMS = {name: BUILD / place for name, place in (
     ("vexoelasticd", "platform/elasticd/vexoelasticd"), ("vexonotifyd", "platform/notifyd/vexonotifyd"),
     ("fileindexd", "src/fileindexd/fileindexd"), ("fileindexctl", "src/fileindexctl/fileindexctl"))}
@@ -110,9 +110,11 @@ def below(directory, end=""):
 
 
 class Ours:
-    def __init__(self, volume):
+    def __init__(self, volume, fresh=True):
+        """The daemons, with the index that is there unless it is to be made afresh."""
         self.volume = volume
-        for place in ("/var/lib/vexonotifyd", "/var/packages/Quarrox", "/run/vexoelasticd.sock", volume / "@fileindex"):
+        indexes = [volume / "@fileindex", ROOT / "engine"] if fresh else []
+        for place in ("/var/lib/vexonotifyd", "/var/packages/Quarrox", "/run/vexoelasticd.sock", *indexes):
             shutil.rmtree(place, ignore_errors=True)
         machine.write("/etc/vexo/shares.conf", "[docs]\npath = %s/docs\n" % volume)
         os.makedirs("/var/packages/Quarrox/etc")
@@ -188,10 +190,11 @@ class Ours:
 
 
 class Recoll:
-    def __init__(self, docs):
+    def __init__(self, docs, fresh=True):
         self.config = ROOT / "recoll"
-        shutil.rmtree(self.config, ignore_errors=True)
-        self.config.mkdir(parents=True)
+        if fresh:
+            shutil.rmtree(self.config, ignore_errors=True)
+        self.config.mkdir(parents=True, exist_ok=True)
         (self.config / "recoll.conf").write_text(f"topdirs = {docs}\nnoaspell = 1\nskippedNames =\n")
 
     def run(self):

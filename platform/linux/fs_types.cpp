@@ -4,10 +4,7 @@
 
 #include <algorithm>
 #include <iterator>
-#include <string>
 #include <unordered_map>
-
-#include <libmount/libmount.h>
 
 #include "vexo/filesystem.h"
 
@@ -129,8 +126,7 @@ bool IsOfFamily(int number, Family family) {
 int FsTypeByName(std::string_view name) {
   static const auto numbers = NumbersByName();
   const auto found = numbers.find(name);
-  if (found != numbers.end()) return found->second;
-  return mnt_fstype_is_netfs(std::string(name).c_str()) != 0 ? VEXO_FS_REMOTE : VEXO_FS_OTHER;
+  return found != numbers.end() ? found->second : VEXO_FS_OTHER;
 }
 
 int FsTypeByMagic(unsigned long magic) {

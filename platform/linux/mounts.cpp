@@ -1,15 +1,18 @@
 #include "linux/mounts.h"
 
 #include <fcntl.h>
+#include <mntent.h>
 #include <poll.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
+#include <fstream>
 #include <initializer_list>
 #include <mutex>
-
-#include <libmount/libmount.h>
+#include <sstream>
+#include <string_view>
 
 #include "common/unique_fd.h"
 #include "linux/fs_types.h"
@@ -21,27 +24,44 @@ namespace {
 
 constexpr char kMountInfo[] = "/proc/self/mountinfo";
 
-std::string Text(const char* text) {
-  return text != nullptr ? text : "";
-}
-
-bool HasAnyOption(const std::string& options, std::initializer_list<const char*> names) {
-  for (const char* name : names) {
-    if (mnt_optstr_get_option(options.c_str(), name, nullptr, nullptr) == 0) return true;
+// Blanks, line ends and backslashes in names stand as a backslash and three octal digits.
+std::string Unescape(const std::string& text) {
+  constexpr size_t kDigits = 3;
+  std::string name;
+  for (size_t at = 0; at < text.size(); ++at) {
+    const bool escaped = text[at] == '\\' && text.find_first_not_of("01234567", at + 1) > at + kDigits;
+    if (escaped && at + kDigits < text.size()) {
+      name += static_cast<char>(std::stoi(text.substr(at + 1, kDigits), nullptr, 8));
+      at += kDigits;
+    } else {
+      name += text[at];
+    }
   }
-  return false;
+  return name;
 }
 
-// What file systems show while they enforce quotas. XFS shows others ("uqnoenforce") where it only counts.
-Mount ToMount(libmnt_fs* entry) {
-  Mount mount;
-  mount.type = Text(mnt_fs_get_fstype(entry));
-  mount.fs_type = FsTypeByName(mount.type);
-  mount.source = Text(mnt_fs_get_source(entry));
-  const std::string options = Text(mnt_fs_get_fs_options(entry));
-  mount.user_quota = HasAnyOption(options, {"usrquota", "usrjquota", "uquota", "quota"});
-  mount.group_quota = HasAnyOption(options, {"grpquota", "grpjquota", "gquota"});
-  return mount;
+bool HasAnyOption(std::string options, std::initializer_list<const char*> names) {
+  mntent entry = {};
+  entry.mnt_opts = options.data();
+  return std::any_of(names.begin(), names.end(), [&](const char* name) { return hasmntopt(&entry, name) != nullptr; });
+}
+
+// The mount's number stands first; its type, source and options stand behind a lone "-".
+bool ParseLine(const std::string& line, uint64_t* number, Mount* mount) {
+  constexpr std::string_view kBetween = " - ";
+  const size_t end = line.find(kBetween);
+  if (end == std::string::npos || !(std::istringstream(line) >> *number)) return false;
+  std::istringstream rest(line.substr(end + kBetween.size()));
+  std::string source;
+  std::string options;
+  if (!std::getline(rest, mount->type, ' ') || !std::getline(rest, source, ' ')) return false;
+  if (!std::getline(rest, options)) return false;
+  mount->fs_type = FsTypeByName(mount->type);
+  mount->source = Unescape(source);
+  // What file systems show while they enforce quotas. XFS shows others ("uqnoenforce") where it only counts.
+  mount->user_quota = HasAnyOption(options, {"usrquota", "usrjquota", "uquota", "quota"});
+  mount->group_quota = HasAnyOption(options, {"grpquota", "grpjquota", "gquota"});
+  return true;
 }
 
 // Knows the table as it is now. Thread-safe.
@@ -84,17 +104,13 @@ class MountWatch {
 }  // namespace
 
 std::shared_ptr<const MountTable> MountTable::Read(const char* file) {
-  const std::unique_ptr<libmnt_table, void (*)(libmnt_table*)> parsed(mnt_new_table(), mnt_unref_table);
-  const std::unique_ptr<libmnt_iter, void (*)(libmnt_iter*)> iterator(mnt_new_iter(MNT_ITER_FORWARD), mnt_free_iter);
-  if (parsed == nullptr || iterator == nullptr) return nullptr;
-  if (const int result = mnt_table_parse_file(parsed.get(), file); result != 0) {
-    errno = result < 0 ? -result : EIO;
-    return nullptr;
-  }
+  std::ifstream lines(file);
+  if (!lines) return nullptr;
   auto table = std::make_shared<MountTable>();
-  libmnt_fs* entry = nullptr;
-  while (mnt_table_next_fs(parsed.get(), iterator.get(), &entry) == 0) {
-    table->mounts_.emplace(static_cast<uint64_t>(mnt_fs_get_id(entry)), ToMount(entry));
+  uint64_t number = 0;
+  Mount mount;
+  for (std::string line; std::getline(lines, line);) {
+    if (ParseLine(line, &number, &mount)) table->mounts_.emplace(number, mount);
   }
   return table;
 }

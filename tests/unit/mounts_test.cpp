@@ -14,16 +14,21 @@ namespace {
 
 TEST(MountTableTest, NamesSourcesAndQuotasAreReadAndABrokenLineIsLeftOut) {
   const quarrox::support::TempDir dir;
-  quarrox::support::WriteText(dir / "mountinfo",
-                              "30 1 8:1 / / rw,relatime shared:1 - ext4 /dev/sda1 rw,usrquota,grpjquota=aquota.group\n"
-                              "31 30 0:40 / /mnt/a\\040b rw - cifs //nas/my\\040docs rw,vers=3.0\nno mount\n"
-                              "32 30 0:41 / /f rw,nosuid shared:9 master:2 - fuse.sshfs alice@nas:/x rw,user_id=0\n"
-                              "33 30 8:2 /sub /x rw - xfs /dev/sdb rw,uqnoenforce,gqnoenforce\n");
+  quarrox::support::WriteText(
+      dir / "mountinfo",
+      "30 1 8:1 / / rw,relatime shared:1 - ext4 /dev/sda1 rw,usrquota,grpjquota=aquota.group\n"
+      "31 30 0:40 / /mnt/a\\040b rw - cifs //nas/my\\040docs rw,vers=3.0\nno mount\n"
+      "32 30 0:41 / /f rw,nosuid shared:9 master:2 - fuse.sshfs alice@nas:/x rw,user_id=0\n"
+      "33 30 8:2 /sub /x rw - xfs /dev/sdb rw,uqnoenforce,gqnoenforce\n"
+      "34 30 0:42 / /- rw - tmpfs  rw\n35 30 0:43 / /g rw - ext4 /dev/a\\04\\1344 rw,noquota\n");
   const auto table = MountTable::Read((dir / "mountinfo").c_str());
   ASSERT_TRUE(table != nullptr && table->Find(30) != nullptr && table->Find(33) != nullptr);
   EXPECT_EQ(table->Find(31)->source, "//nas/my docs");
   EXPECT_EQ(table->Find(32)->fs_type, VEXO_FS_SSHFS);
   EXPECT_TRUE(table->Find(30)->user_quota && table->Find(30)->group_quota && !table->Find(33)->user_quota);
+  EXPECT_TRUE(table->Find(34) != nullptr && table->Find(34)->fs_type == VEXO_FS_TMPFS &&
+              table->Find(34)->source.empty());
+  EXPECT_TRUE(table->Find(35) != nullptr && table->Find(35)->source == "/dev/a\\04\\4" && !table->Find(35)->user_quota);
   EXPECT_EQ(MountTable::Read((dir / "missing").c_str()), nullptr);
 }
 
