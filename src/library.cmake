@@ -21,7 +21,8 @@ add_dependencies(fileindex common fileindex_core vexocontentextract)
 
 # What a user of the library includes: the public headers name jsoncpp and Boost, both found by name.
 install(TARGETS fileindex EXPORT fileindexTargets LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR})
-install(DIRECTORY include/common DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/quarrox FILES_MATCHING PATTERN "*.h")
+install(DIRECTORY include/common DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/quarrox FILES_MATCHING PATTERN "*.h"
+        PATTERN "watchdog.h" EXCLUDE)  # of the daemons alone, with a library of its own
 install(FILES fileindex/optree.h fileindex/util.h fileindex/folder.h fileindex/folder_mgr.h fileindex/queue_mgr.h
               fileindex/communication.h fileindex/status_mgr.h fileindex/notices.h fileindex/elastic_control.h
               fileindex/custom_events.h fileindex/index_mgr.h fileindex/index_progress.h fileindex/index_failures.h

@@ -18,6 +18,7 @@
 #include "common/listener.h"
 #include "common/log.h"
 #include "common/peer.h"
+#include "common/watchdog.h"
 #include "server_worker.h"
 
 namespace quarrox::elasticd {
@@ -101,6 +102,8 @@ struct Server::Impl {
   bool MayLeave();
   void Leave();
   void Process(Worker& worker, uint64_t token, uint64_t& duty);
+  void WakeUp(Worker& worker);
+  void WakeForWatchdog();
   UniqueFd AcceptOne(uint64_t& duty);
   void Accept(Worker& worker, uint64_t& duty);
   void Welcome(Worker& worker, UniqueFd& client);
@@ -208,11 +211,23 @@ void Server::Impl::Process(Worker& worker, uint64_t token, uint64_t& duty) {
       return;
     case ConnectionTable::kTimerToken:
       if (accepting_paused.exchange(false)) duty = kListenerToken;
-      if (Connection* overdue = table.TakeOverdue()) worker.Serve(*overdue);
-      return;
+      return WakeUp(worker);
     default:
       if (Connection* ready = table.Take(token)) worker.Serve(*ready);
   }
+}
+
+// The service manager's word goes the way of every event: it says that there is a thread that takes them.
+// What is for everybody does not vouch for the rest.
+void Server::Impl::WakeUp(Worker& worker) {
+  if (!settings.for_everybody) Watchdog::OfProcess().Alive();
+  Connection* overdue = table.TakeOverdue();
+  WakeForWatchdog();
+  if (overdue != nullptr) worker.Serve(*overdue);
+}
+
+void Server::Impl::WakeForWatchdog() {
+  if (!settings.for_everybody) table.WakeAt(Watchdog::OfProcess().due());
 }
 
 UniqueFd Server::Impl::AcceptOne(uint64_t& duty) {
@@ -287,6 +302,7 @@ Server::Server(Settings settings, Handler handler, Refuse refuse)
 Server::~Server() = default;
 
 void Server::Run() {
+  impl_->WakeForWatchdog();
   for (int i = 0; i < kThreadsKept; ++i) impl_->Spawn();
   std::unique_lock lock(impl_->threads_mutex);
   impl_->all_left.wait(lock, [this] { return impl_->threads == 0; });

@@ -14,6 +14,7 @@
 
 #include "common/error.h"
 #include "common/unique_fd.h"
+#include "common/watchdog.h"
 #include "monitor_service.h"
 #include "scope.h"
 
@@ -45,11 +46,15 @@ std::unique_ptr<MonitorService> WatchOne(const Options& options) {
 bool RunOnce(MonitorService& service, int signals) {
   std::vector<pollfd> fds = {{signals, POLLIN, 0}};
   service.AddPollFds(fds);
-  const int ready = poll(fds.data(), fds.size(), service.Timeout());
+  Watchdog& watchdog = Watchdog::OfProcess();
+  const int service_timeout = service.Timeout();
+  const int timeout = watchdog.Timeout(service_timeout);
+  const int ready = poll(fds.data(), fds.size(), timeout);
   if (ready < 0 && errno != EINTR) throw Error(kErrSystem, std::string("poll failed, reason=") + strerror(errno));
   if (ready < 0) return true;
   if (fds[0].revents != 0) return false;
-  service.Process(fds.data() + 1, ready == 0);
+  watchdog.Alive();
+  service.Process(fds.data() + 1, ready == 0 && timeout == service_timeout);
   return true;
 }
 

@@ -10,6 +10,7 @@
 
 #include "common/error.h"
 #include "common/log.h"
+#include "common/watchdog.h"
 
 namespace quarrox::notifyd {
 namespace {
@@ -97,6 +98,7 @@ int DirHandles::Open(const std::string& handle) {
   if (open_.size() >= kMaxOpen) open_.clear();
   const int mount = Mount();
   if (mount < 0) return -1;
+  Watchdog::OfProcess().Alive();
   int fd = OpenHandle(mount, handle);
   if (fd < 0 && (errno == EMFILE || errno == ENFILE || errno == ENOMEM)) {
     open_.clear();

@@ -10,6 +10,7 @@
 #include <memory>
 
 #include "common/error.h"
+#include "common/watchdog.h"
 
 namespace quarrox::notifyd {
 namespace {
@@ -51,6 +52,7 @@ WatchTree::WatchTree(const Scope& scope) : scope_(scope), fd_(inotify_init1(IN_N
 }
 
 int WatchTree::AddWatch(const std::string& path) {
+  Watchdog::OfProcess().Alive();
   const int wd = inotify_add_watch(fd_.get(), path.c_str(), kMask);
   if (wd < 0 && !IsGone(errno)) error_ = errno;
   return wd;

@@ -13,6 +13,7 @@
 
 #include "common/error.h"
 #include "common/log.h"
+#include "common/watchdog.h"
 #include "fileindex/folder_mgr.h"
 
 namespace quarrox::fileindexd {
@@ -106,7 +107,9 @@ void Daemon::CarryOut(const Command& command) {
 void Daemon::RunOnce() {
   pollfd fds[2 + QueueWatch::kPollFds] = {{signals_.fd(), POLLIN, 0}, {socket_.fd(), POLLIN, 0}};
   folders_.FillPollFds(fds + 2);
-  PollUntil(fds, std::size(fds), std::min({socket_.Deadline(), pool_.Deadline(), look_at_, stop_at_}));
+  Watchdog& watchdog = Watchdog::OfProcess();
+  PollUntil(fds, std::size(fds), std::min({socket_.Deadline(), pool_.Deadline(), look_at_, stop_at_, watchdog.due()}));
+  watchdog.Alive();
   TakeSignals();
   if (stop_at_ == kNever) {
     std::vector<Command> commands;

@@ -48,9 +48,16 @@ class PackagingTest(unittest.TestCase):
             self.assertIn("\n  %s " % name, run(CTL, "--help"))
             self.assertEqual(re.findall(r"^  --\S+(?: [A-Z]\S*)? *$", run(CTL, *name.split(), "-h"), re.MULTILINE), [])
         os.environ["MANROFFOPT"] = "-z"  # nothing but warnings
-        for page in ("fileindexctl.1", "fileindex.5", "fileindexd.8", "vexoelasticd.8", "vexonotifyd.8"):
+        for page in ("fileindexctl.1", "fileindex.5", "fileindex-query.7", "fileindexd.8", "vexoelasticd.8", "vexonotifyd.8"):
             self.assertEqual(run("man", "--warnings", "-E", "UTF-8", "-l", "-Tutf8", installed(page)), "")
         self.assertIn("did you mean 'folder list'?", run(CTL, "foldr", "lst"))
+
+    def test_the_page_of_the_query_language_has_each_element_that_the_help_has(self):
+        told = re.findall(r"^  (\S+(?: \S+)*)  +(.*\S)", run(CTL, "search", "-h").split("QUERY may hold:")[1], re.MULTILINE)
+        page = run("env", "MANROFFOPT=-rHY=0", "man", "-E", "ascii", "-l", "-Tascii", installed("fileindex-query.7"))
+        page = " ".join(re.sub(r"\x1b\[[0-9;]*m|.\x08", "", page).split()).split("It may hold: ")[1].split(" The options of ")[0]
+        self.assertGreater(len(told), 10)
+        self.assertEqual(page, " ".join(" ".join(row) for row in told))
 
     def test_bash_completes_options_shares_and_folders(self):
         machine.write("/etc/vexo/shares.conf", "[docs]\npath = /srv/docs\n[two words]\npath = /srv/two words\n")
@@ -65,6 +72,8 @@ class PackagingTest(unittest.TestCase):
         os.makedirs(ROOT + "/etc")
         subprocess.run(["mount", "--bind", prefix, prefix[len(ROOT):]], check=True)
         self.assertEqual(run("systemd-analyze", "verify", *glob.glob(prefix + "/lib/systemd/system/*")), "")
+        for unit in glob.glob(prefix + "/lib/systemd/system/*.service"):  # the limit is 4.0 of 10
+            subprocess.check_output(["systemd-analyze", "security", "--offline=yes", "--threshold=40", unit])
         for tool, options in [("sysusers", []), ("tmpfiles", ["--create"])]:
             conf = "%s/lib/%s.d/fileindex.conf" % (prefix, tool)
             self.assertRegex(run("systemd-" + tool, "--root=" + ROOT, *options, conf), "^(Creating .*\n)*$")
