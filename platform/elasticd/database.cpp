@@ -118,6 +118,10 @@ uint64_t AllCounted(const SearchOptions& options) {
 
 }  // namespace
 
+std::string LibraryVersion() {
+  return std::string("Xapian ") + Xapian::version_string();
+}
+
 // Keys are written in order and all at once, before a commit: the tree on disk then grows by full blocks, not by
 // halves.
 struct Writer::Impl {

@@ -20,6 +20,9 @@
 
 namespace quarrox::elasticd {
 
+// What keeps the files, and its version.
+std::string LibraryVersion();
+
 class DamagedDatabase : public Error {
  public:
   explicit DamagedDatabase(const std::string& reason) : Error(kInputOutput, reason) {}

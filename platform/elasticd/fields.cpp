@@ -90,6 +90,25 @@ std::string Unseal(std::string sealed) {
   return sealed;
 }
 
+// Stands behind the fields of a document: four bytes of a time and this mark, which ends no JSON. Documents that were
+// made before times were kept have neither.
+constexpr char kTimeMark = '\x01';
+constexpr size_t kTimeSize = sizeof(uint32_t) + sizeof(kTimeMark);
+
+std::string PackTime(int64_t time) {
+  const auto seconds = static_cast<uint32_t>(time);
+  return std::string(reinterpret_cast<const char*>(&seconds), sizeof(seconds)) + kTimeMark;
+}
+
+// Cuts it off.
+int64_t UnpackTime(std::string& fields) {
+  uint32_t seconds = 0;
+  if (fields.size() < kTimeSize || fields.back() != kTimeMark) return 0;
+  memcpy(&seconds, fields.data() + fields.size() - kTimeSize, sizeof(seconds));
+  fields.resize(fields.size() - kTimeSize);
+  return seconds;
+}
+
 Json::Value Parse(const std::string& text) {
   Json::Value parsed;
   if (!fromString(parsed, text) || !parsed.isObject()) throw DamagedDatabase("the fields of a document do not parse");
@@ -133,6 +152,21 @@ bool IsLong(const Json::Value& value) {
   const char* begin = nullptr;
   const char* end = nullptr;
   return value.isArray() || (value.getString(&begin, &end) && static_cast<size_t>(end - begin) >= kLongText);
+}
+
+// The name is among the texts, too.
+uint64_t TextBytes(const KeptFields& kept, const Mapping& mapping) {
+  uint64_t bytes = 0;
+  for (const Json::Value* part : {&kept.texts, &kept.plain}) {
+    for (auto field = part->begin(); field != part->end(); ++field) {
+      const Field known = mapping.Get(field.name());
+      const char* begin = nullptr;
+      const char* end = nullptr;
+      const bool counts = known.type == FieldType::kText && !known.ngram && field->getString(&begin, &end);
+      if (counts) bytes += static_cast<uint64_t>(end - begin);
+    }
+  }
+  return bytes;
 }
 
 Json::Value ShowAll(const Store& store, const Mapping& mapping, const PathFields& path_fields, DocumentId id,
@@ -192,7 +226,7 @@ KeptFields PartFields(Json::Value fields, const PathFields& path_fields) {
 }
 
 void SaveFields(Writer& writer, DocumentId id, const KeptFields& fields, Texts texts) {
-  writer.Set(FieldsKey(id), Seal(toString(fields.plain)));
+  writer.Set(FieldsKey(id), Seal(toString(fields.plain) + (fields.indexed == 0 ? "" : PackTime(fields.indexed))));
   if (texts == Texts::kLeave) return;
   writer.Set(TextsKey(id), fields.texts.empty() ? std::string() : Compress(JoinTexts(fields.texts)));
 }
@@ -201,7 +235,9 @@ KeptFields LoadFields(const Store& store, DocumentId id, Texts texts) {
   KeptFields fields;
   const std::string plain = store.Get(FieldsKey(id));
   if (plain.empty()) return fields;
-  fields.plain = Parse(Unseal(plain));
+  std::string text = Unseal(plain);
+  fields.indexed = UnpackTime(text);
+  fields.plain = Parse(text);
   const std::string packed = texts == Texts::kBoth ? store.Get(TextsKey(id)) : std::string();
   if (!packed.empty()) fields.texts = PartTexts(Decompress(packed));
   return fields;
@@ -242,12 +278,21 @@ Json::Value ShowFields(const Store& store, const Mapping& mapping, const PathFie
       shown[name] = path_fields.Value(name, directory, base);
       continue;
     }
-    if (!mapping.Get(name).stored) continue;
+    const bool is_told = name == kIndexedField || name == kTextBytesField;
+    if (!is_told && !mapping.Get(name).stored) continue;
     if (kept.plain.isNull()) kept = LoadFields(store, id, Texts::kLeave);
     if (kept.plain.isNull()) return Json::Value();
+    if (name == kIndexedField) {
+      if (kept.indexed != 0) shown[name] = Json::Int64{kept.indexed};
+      continue;
+    }
     if (!kept.plain.isMember(name) && kept.texts.isNull()) {
       kept = LoadFields(store, id, Texts::kBoth);
       if (kept.texts.isNull()) kept.texts = Json::Value(Json::objectValue);
+    }
+    if (name == kTextBytesField) {
+      shown[name] = Json::UInt64{TextBytes(kept, mapping)};
+      continue;
     }
     const Json::Value& part = kept.plain.isMember(name) ? kept.plain : kept.texts;
     if (part.isMember(name)) shown[name] = part[name];

@@ -46,7 +46,13 @@ class PathFields {
 struct KeptFields {
   Json::Value plain;
   Json::Value texts;
+  int64_t indexed = 0;  // when the document was last made as a whole, in seconds since the epoch; 0: not known
 };
+
+// What can be asked for as if it were a field, though no document has it: KeptFields::indexed, where it is known; and
+// how many bytes of text there are besides the names.
+inline constexpr char kIndexedField[] = "@indexed";
+inline constexpr char kTextBytesField[] = "@text_bytes";
 
 // Parts the fields, without those that follow from the identity and those that are null.
 KeptFields PartFields(Json::Value fields, const PathFields& path_fields);

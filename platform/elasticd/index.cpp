@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <chrono>
+#include <ctime>
 #include <utility>
 
 #include "common/json.h"
@@ -316,7 +317,9 @@ void Index::Save(Open& open, const std::string& path, Json::Value fields, const 
     const Place place = open.places.Put(path, id);
     open.writer.Add(content, PackPlace(place));
   }
-  SaveFields(open.writer, id, PartFields(std::move(fields), path_fields_), Texts::kBoth);
+  KeptFields kept = PartFields(std::move(fields), path_fields_);
+  kept.indexed = time(nullptr);
+  SaveFields(open.writer, id, kept, Texts::kBoth);
 }
 
 // Indexes the document that was accepted last.

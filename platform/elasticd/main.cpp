@@ -13,6 +13,7 @@
 
 #include "common/log.h"
 #include "common/search_socket.h"
+#include "database.h"
 #include "engine.h"
 #include "error_code.h"
 #include "options.h"
@@ -118,6 +119,10 @@ int main(int argc, char** argv) {
   setenv("XAPIAN_FLUSH_THRESHOLD", "1000000000", 0);
   try {
     const Options options = ParseOptions(argc, argv);
+    if (options.version) {
+      printf("vexoelasticd " FILEINDEX_VERSION ", %s\n", LibraryVersion().c_str());
+      return 0;
+    }
     if (!options.help) return Serve(options);
     fputs(kUsage, stdout);
     return 0;

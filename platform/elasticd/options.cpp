@@ -5,12 +5,13 @@
 namespace quarrox::elasticd {
 namespace {
 
-enum Option { kForeground = 1, kData, kCheck, kHelp };
+enum Option { kForeground = 1, kData, kCheck, kVersion, kHelp };
 
 constexpr option kOptions[] = {
     {"foreground", no_argument, nullptr, kForeground},
     {"data", required_argument, nullptr, kData},
     {"check", required_argument, nullptr, kCheck},
+    {"version", no_argument, nullptr, kVersion},
     {"help", no_argument, nullptr, kHelp},
     {nullptr, 0, nullptr, 0},
 };
@@ -30,6 +31,9 @@ void Apply(Options& options, int option) {
       break;
     case kCheck:
       options.check = Directory();
+      break;
+    case kVersion:
+      options.version = true;
       break;
     case kHelp:
       options.help = true;
@@ -51,6 +55,7 @@ const char* const kUsage =
     "  --foreground   write the log to standard error, too\n"
     "  --data DIR     keep the list of indexes here (default /var/lib/vexoelasticd)\n"
     "  --check DIR    check the database in DIR: status 0 where it is sound, 1 where it is damaged\n"
+    "  --version      print the program's version\n"
     "  --help         show this text\n";
 
 Options ParseOptions(int argc, char** argv) {
@@ -58,7 +63,8 @@ Options ParseOptions(int argc, char** argv) {
   opterr = 0;
   optind = 1;
   for (int option; (option = getopt_long(argc, argv, "", kOptions, nullptr)) != -1;) Apply(options, option);
-  if (optind < argc && !options.help) throw UsageError(std::string("'") + argv[optind] + "' is not expected");
+  if (optind < argc && !options.help && !options.version)
+    throw UsageError(std::string("'") + argv[optind] + "' is not expected");
   return options;
 }
 

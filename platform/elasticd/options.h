@@ -8,6 +8,7 @@ namespace quarrox::elasticd {
 
 struct Options {
   bool help = false;
+  bool version = false;
   bool foreground = false;  // log to standard error, too
   std::string data = "/var/lib/vexoelasticd";
   std::string check;  // the database to check instead of being the engine

@@ -1,7 +1,9 @@
 #include "daemon.h"
 
+#include <fcntl.h>
 #include <poll.h>
 #include <signal.h>
+#include <sys/file.h>
 #include <sys/signalfd.h>
 
 #include <cerrno>
@@ -17,9 +19,12 @@
 #include "common/watchdog.h"
 #include "monitor_service.h"
 #include "scope.h"
+#include "watch_status.h"
 
 namespace quarrox::notifyd {
 namespace {
+
+constexpr char kLockPath[] = "/var/run/vexonotifyd.lock";
 
 UniqueFd CatchStopSignals() {
   sigset_t signals;
@@ -30,6 +35,14 @@ UniqueFd CatchStopSignals() {
   UniqueFd fd(signalfd(-1, &signals, SFD_CLOEXEC));
   if (!fd) throw Error(kErrSystem, std::string("signalfd failed, reason=") + strerror(errno));
   return fd;
+}
+
+// Held for as long as the configurations are served: two daemons would write each event twice. Where the lock cannot be
+// made there is none.
+UniqueFd BeTheOnlyOne() {
+  UniqueFd lock(open(kLockPath, O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
+  if (!lock || flock(lock.get(), LOCK_EX | LOCK_NB) == 0 || errno != EWOULDBLOCK) return lock;
+  throw Error(kErrSystem, std::string("another vexonotifyd serves the configurations already, it holds ") + kLockPath);
 }
 
 // One directory and one queue, as given on the command line.
@@ -62,8 +75,10 @@ bool RunOnce(MonitorService& service, int signals) {
 
 void RunDaemon(const Options& options) {
   const UniqueFd signals = CatchStopSignals();
-  const auto service =
-      options.dir.empty() ? std::make_unique<MonitorService>(options, kMonitorDirectory) : WatchOne(options);
+  const UniqueFd lock = options.dir.empty() ? BeTheOnlyOne() : UniqueFd();
+  const auto service = options.dir.empty()
+                           ? std::make_unique<MonitorService>(options, kMonitorDirectory, kWatchStatusPath)
+                           : WatchOne(options);
   sd_notify(0, "READY=1");
   try {
     while (RunOnce(*service, signals.get())) {

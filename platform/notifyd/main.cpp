@@ -28,6 +28,10 @@ int Serve(const Options& options) {
 int main(int argc, char** argv) {
   try {
     const Options options = ParseOptions(argc, argv);
+    if (options.version) {
+      puts("vexonotifyd " FILEINDEX_VERSION);
+      return 0;
+    }
     if (!options.help) return Serve(options);
     fputs(kUsage, stdout);
     return 0;

@@ -27,8 +27,9 @@ int Earlier(int a, int b) {
 
 }  // namespace
 
-MonitorService::MonitorService(const Options& options, const std::string& directory)
+MonitorService::MonitorService(const Options& options, const std::string& directory, const std::string& status_file)
     : files_(std::make_unique<MonitorFiles>(directory)), watches_(options.method, options.limited_queue) {
+  if (!status_file.empty()) status_ = std::make_unique<WatchStatus>(status_file);
   Follow();
   Flush();
 }
@@ -150,7 +151,21 @@ void MonitorService::Follow() {
   MarkHeardAgain(wanted);
   for (const auto& [queue, path] : std::exchange(to_mark_, {})) queue->Add({kLost, false, path, {}});
   CloseQueues();
+  TellWatches();
   retry_ = watches_.unheard().empty() ? Clock::time_point::max() : Clock::now() + kRetryUnheard;
+}
+
+void MonitorService::TellWatches() {
+  if (status_ == nullptr) return;
+  WatchStatus::Folders folders;
+  for (const auto& [name, monitor] : monitors()) {
+    for (const MonitoredFolder& folder : monitor.folders) {
+      const auto unheard = watches_.unheard().find(folder.path);
+      const std::string why = unheard == watches_.unheard().end() ? "" : unheard->second;
+      folders[folder.path] = {watches_.MethodOf(folder.path), why, 0};
+    }
+  }
+  status_->Tell(std::move(folders));
 }
 
 void MonitorService::AddPollFds(std::vector<pollfd>& fds) const {
@@ -179,7 +194,10 @@ void MonitorService::Process(const pollfd* fds, bool timed_out) {
     Follow();
   } else {
     watches_.Drain(places + FolderPlaces::kPollFds, timed_out);
-    if (!watches_.unheard().empty() && retry_ == Clock::time_point::max()) retry_ = Clock::now() + kRetryFailed;
+    if (!watches_.unheard().empty() && retry_ == Clock::time_point::max()) {
+      retry_ = Clock::now() + kRetryFailed;
+      TellWatches();
+    }
   }
   Flush();
 }

@@ -20,6 +20,7 @@
 #include "monitor_files.h"
 #include "options.h"
 #include "queue_writer.h"
+#include "watch_status.h"
 #include "watches.h"
 
 struct pollfd;
@@ -28,8 +29,9 @@ namespace quarrox::notifyd {
 
 class MonitorService {
  public:
-  // Serves the configurations in `directory`. Throws Error 502 where they cannot be watched.
-  MonitorService(const Options& options, const std::string& directory);
+  // Serves the configurations in `directory`. Throws Error 502 where they cannot be watched. How their folders are
+  // watched is told in `status_file`, if one is named.
+  MonitorService(const Options& options, const std::string& directory, const std::string& status_file = {});
 
   // Serves this one configuration, and writes no mark at the start. Throws Error 502 where its folders cannot be
   // watched.
@@ -63,6 +65,7 @@ class MonitorService {
   void Tell(const std::vector<WantedFolder>& wanted, const FolderPlaces::Changes& changes);
   void TellNew(const std::vector<WantedFolder>& wanted);
   void NoteUnheard();
+  void TellWatches();
   void MarkHeardAgain(const std::vector<WantedFolder>& wanted);
   void Flush();
 
@@ -75,6 +78,7 @@ class MonitorService {
   std::map<EventSink*, std::set<std::string>> followed_;        // the folders that each queue has told of
   std::set<std::string> was_unheard_;                           // folders, whose queues are to be marked
   Watches watches_;                                             // after the queues, which they write to
+  std::unique_ptr<WatchStatus> status_;
   Clock::time_point retry_ = Clock::time_point::max();
 };
 

@@ -5,7 +5,7 @@
 namespace quarrox::notifyd {
 namespace {
 
-enum Option { kWatch = 1, kQueue, kMethod, kLimited, kForeground, kHelp };
+enum Option { kWatch = 1, kQueue, kMethod, kLimited, kForeground, kVersion, kHelp };
 
 constexpr option kOptions[] = {
     {"watch", required_argument, nullptr, kWatch},
@@ -13,6 +13,7 @@ constexpr option kOptions[] = {
     {"method", required_argument, nullptr, kMethod},
     {"limited-queue", no_argument, nullptr, kLimited},
     {"foreground", no_argument, nullptr, kForeground},
+    {"version", no_argument, nullptr, kVersion},
     {"help", no_argument, nullptr, kHelp},
     {nullptr, 0, nullptr, 0},
 };
@@ -41,6 +42,9 @@ void Apply(Options& options, int option) {
     case kForeground:
       options.foreground = true;
       break;
+    case kVersion:
+      options.version = true;
+      break;
     case kHelp:
       options.help = true;
       break;
@@ -66,6 +70,7 @@ const char* const kUsage =
     "                    permitted here (default)\n"
     "  --foreground      write the log to standard error, too\n"
     "  --limited-queue   let the kernel drop events past its limit, which is then reported as a loss\n"
+    "  --version         print the program's version\n"
     "  --help            show this text\n";
 
 Options ParseOptions(int argc, char** argv) {
@@ -73,7 +78,7 @@ Options ParseOptions(int argc, char** argv) {
   opterr = 0;
   optind = 1;
   for (int option; (option = getopt_long(argc, argv, "", kOptions, nullptr)) != -1;) Apply(options, option);
-  if (options.help) return options;
+  if (options.help || options.version) return options;
   if (optind < argc) throw UsageError(std::string("'") + argv[optind] + "' is not expected");
   if (options.dir.empty() && !options.queue.empty()) throw UsageError("--watch DIR is missing");
   if (!options.dir.empty() && options.queue.empty()) throw UsageError("--queue FILE is missing");

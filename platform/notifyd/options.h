@@ -15,6 +15,7 @@ struct Options {
   bool limited_queue = false;
   bool foreground = false;
   bool help = false;
+  bool version = false;
 };
 
 class UsageError : public std::runtime_error {

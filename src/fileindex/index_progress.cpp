@@ -53,6 +53,7 @@ std::optional<IndexProgress> IndexProgress::Load(const std::string& file) {
   }
   progress.path = TextOf(data["path"]);
   progress.reason = TextOf(data["reason"]);
+  progress.held_back_by = TextOf(data["held_back_by"]);
   return progress;
 }
 
@@ -69,6 +70,7 @@ bool IndexProgress::Save(const std::string& file) const {
   for (const uint64_t count : operations) data["operations"].append(Json::UInt64{count});
   data["path"] = path;
   data["reason"] = reason;
+  data["held_back_by"] = held_back_by;
   const std::string text = toString(data) + '\n';
   const std::string beside = file + ".new";
   const UniqueFd out(open(beside.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC | O_NOFOLLOW, 0600));

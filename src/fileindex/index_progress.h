@@ -34,8 +34,9 @@ struct QUARROX_API IndexProgress {
   // pass that is made again count again.
   std::array<uint64_t, 8> operations = {};
 
-  std::string path;    // what is being worked on
-  std::string reason;  // why it waits
+  std::string path;          // what is being worked on
+  std::string reason;        // why it waits
+  std::string held_back_by;  // what others need of the machine, so that it rests now and then: "disk" and so on
 
   // The file of a share, in the directory of its database.
   static std::string FileOf(const sdk::SDKShare& share);

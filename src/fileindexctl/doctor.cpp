@@ -4,7 +4,6 @@
 
 #include <algorithm>
 #include <iostream>
-#include <set>
 
 #include "command.h"
 #include "common/error.h"
@@ -24,7 +23,9 @@ struct Row {
 constexpr Row kChecks[] = {
     {"caller", CheckCaller},
     {"versions", CheckVersions},
+    {"files", CheckFiles},
     {"daemons", CheckDaemons},
+    {"limits", CheckLimits},
     {"sockets", CheckSockets},
     {"rights", CheckRights},
     {"locks", CheckLocks},
@@ -37,20 +38,22 @@ constexpr Row kChecks[] = {
     {"folders", CheckFolders},
     {"index", CheckIndexes},
     {"monitor", CheckMonitors},
+    {"watches", CheckWatches},
     {"flags", CheckFlags},
     {"leftovers", CheckLeftovers},
 };
 
-// What keeps a check from its end may keep others from theirs: that is said once.
-Findings Run(const Row& row, Machine& machine, std::set<std::string>& failures) {
+// What keeps a check from its end may keep others from theirs: that is said once, as it is where it was found. `said`
+// is all that was found to be wrong before.
+Findings Run(const Row& row, Machine& machine, const std::string& said) {
   Findings findings;
   try {
     row.check(machine, findings);
   } catch (const Error& error) {
-    if (failures.insert(error.reason).second) {
+    if (said.find(error.reason) == std::string::npos) {
       findings.Wrong("not checked to the end, nor is what needs the same: error " + std::to_string(error.code) + ": " +
                          error.reason,
-                     "mend that, then run: fileindexctl doctor");
+                     "mend that, then run: fileindexctl doctor", Remedy::kByHand);
     }
   }
   return findings;
@@ -62,6 +65,7 @@ void PrintJson(const char* check, const Finding& finding) {
   object["ok"] = finding.ok;
   object["finding"] = finding.text;
   object["remedy"] = finding.remedy;
+  object["runnable"] = !finding.ok && finding.kind == Remedy::kCommand;
   std::cout << toString(object) << '\n';
 }
 
@@ -73,38 +77,10 @@ void PrintText(const char* check, const Finding& finding) {
   if (!finding.ok) std::cout << std::string(kWidth, ' ') << "remedy " << Visible(finding.remedy) << '\n';
 }
 
-bool IsPlain(char c) {
-  return ('a' <= c && c <= 'z') || ('A' <= c && c <= 'Z') || ('0' <= c && c <= '9') ||
-         std::string("/._-+=:,@%").find(c) != std::string::npos;
-}
-
 }  // namespace
 
 void Findings::WellIfNothing(const std::string& text) {
   if (list_.empty()) Well(text);
-}
-
-std::string ShellLine(const std::vector<std::string>& words) {
-  std::string line;
-  for (const std::string& word : words) {
-    if (!line.empty()) line += ' ';
-    if (!word.empty() && std::all_of(word.begin(), word.end(), IsPlain)) {
-      line += word;
-      continue;
-    }
-    line += '\'';
-    for (const char c : word) c == '\'' ? line += "'\\''" : line += c;
-    line += '\'';
-  }
-  return line;
-}
-
-std::string ShareCommand(const std::string& verb, const std::string& share, const std::string& operand) {
-  std::vector<std::string> words = {"fileindexctl", "share", verb};
-  if (share.starts_with('-')) words.emplace_back("--");
-  words.push_back(share);
-  if (!operand.empty()) words.push_back(operand);
-  return ShellLine(words);
 }
 
 void CheckCaller(Machine&, Findings& findings) {
@@ -117,13 +93,15 @@ void CheckCaller(Machine&, Findings& findings) {
 
 int Doctor(const Arguments& arguments) {
   doctor::Machine machine;
-  std::set<std::string> failures;
+  std::string said;
   size_t wrong = 0;
   for (const doctor::Row& row : doctor::kChecks) {
-    const doctor::Findings findings = doctor::Run(row, machine, failures);
+    const doctor::Findings findings = doctor::Run(row, machine, said);
     for (const doctor::Finding& finding : findings.list()) {
       arguments.Has("--json") ? doctor::PrintJson(row.name, finding) : doctor::PrintText(row.name, finding);
-      wrong += finding.ok ? 0 : 1;
+      if (finding.ok) continue;
+      ++wrong;
+      said += finding.text + '\n';
     }
     std::cout.flush();
   }

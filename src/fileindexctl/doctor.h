@@ -5,6 +5,8 @@
 // where there is none what to do. A check that is added has its function here and its row in the table of doctor.cpp.
 #pragma once
 
+#include <sys/types.h>
+
 #include <map>
 #include <memory>
 #include <optional>
@@ -16,19 +18,26 @@
 #include "common/sdk/open_shares.h"
 #include "daemon_exchange.h"
 #include "fileindex/folder.h"
+#include "output.h"
 
 namespace quarrox::ctl::doctor {
+
+// What a remedy is: a command for the shell, or what a person has to do.
+enum class Remedy { kCommand, kByHand };
 
 struct Finding {
   bool ok = true;
   std::string text = {};
   std::string remedy = {};  // empty where all is well
+  Remedy kind = Remedy::kCommand;
 };
 
 class Findings {
  public:
   void Well(const std::string& text) { list_.push_back({true, text, ""}); }
-  void Wrong(const std::string& text, const std::string& remedy) { list_.push_back({false, text, remedy}); }
+  void Wrong(const std::string& text, const std::string& remedy, Remedy kind = Remedy::kCommand) {
+    list_.push_back({false, text, remedy, kind});
+  }
 
   // Says a text where nothing was found to be wrong.
   void WellIfNothing(const std::string& text);
@@ -39,11 +48,8 @@ class Findings {
   std::vector<Finding> list_;
 };
 
-// A command for the shell, each word quoted where it has to be.
-std::string ShellLine(const std::vector<std::string>& words);
-
-// "fileindexctl share VERB SHARE [OPERAND]".
-std::string ShareCommand(const std::string& verb, const std::string& share, const std::string& operand = "");
+// Starts a daemon again, or for the first time where `pid` is 0, by what the machine has for that.
+std::string RestartCommand(const std::string& daemon, pid_t pid);
 
 // One configuration of the notification daemon that was made for a share's queue.
 struct MonitorConfig {
@@ -85,6 +91,12 @@ class Machine {
   // The configurations by the queue that they are for.
   const std::map<std::string, MonitorConfig>& monitors();
 
+  // The files among them that are none, though their names say so.
+  const std::vector<std::string>& damaged_monitors() { return (monitors(), damaged_monitors_); }
+
+  // The processes of the daemons that run, by their names, as CheckDaemons finds them.
+  std::map<std::string, pid_t> daemons = {};
+
   // The queues of all shares that are configured.
   const std::set<std::string>& queues();
 
@@ -101,6 +113,7 @@ class Machine {
   std::optional<std::map<std::string, FolderList>> folders_;
   std::optional<std::vector<std::string>> served_;
   std::optional<std::map<std::string, MonitorConfig>> monitors_;
+  std::vector<std::string> damaged_monitors_;
   std::optional<std::set<std::string>> queues_;
   std::optional<std::map<std::string, Stray>> strays_;
 };
@@ -110,6 +123,9 @@ using Check = void(Machine& machine, Findings& findings);
 Check CheckCaller;    // runs as root
 Check CheckVersions;  // the programs
 Check CheckDaemons;   // all three run and answer
+Check CheckFiles;     // that are configurations and states: can be understood
+Check CheckLimits;    // of files that the daemons may have open
+Check CheckWatches;   // how the notification daemon hears folders
 Check CheckSockets;   // modes and owners, as the following two
 Check CheckRights;
 Check CheckLocks;

@@ -1,4 +1,6 @@
 // Whether the contents of files can be read, and whether what a file makes of its reader stays in there.
+#include <sys/stat.h>
+
 #include <string>
 
 #include "doctor.h"
@@ -25,18 +27,28 @@ constexpr Layer kLayers[] = {
      "raise the hard limits that the daemons start with"},
 };
 
+void ReportNoReader(const std::string& program, const std::string& failure, Findings& findings) {
+  const std::string text = "only plain text is read: " + failure;
+  struct stat info;
+  if (stat(program.c_str(), &info) == 0 && S_ISREG(info.st_mode) && info.st_size > 0 && (info.st_mode & 0111) != 0111) {
+    return findings.Wrong(text, ShellLine({"chmod", "0755", program}));
+  }
+  findings.Wrong(text, "install fileindex again", Remedy::kByHand);
+}
+
 }  // namespace
 
 void CheckContents(Machine&, Findings& findings) {
   const Json::Value features = fileindex::elastic::ReaderFeatures();
   if (features.isMember("failure")) {
-    findings.Wrong("only plain text is read: " + features["failure"].asString(), "install fileindex again");
-    return;
+    return ReportNoReader(features["program"].asString(), features["failure"].asString(), findings);
   }
   for (const Layer& layer : kLayers) {
-    if (!features[layer.name].asBool()) findings.Wrong(layer.missing, layer.remedy);
+    if (!features[layer.name].asBool()) findings.Wrong(layer.missing, layer.remedy, Remedy::kByHand);
   }
-  findings.WellIfNothing("read by " + features["program"].asString() + ", which may do nothing else");
+  findings.WellIfNothing("read by " + features["program"].asString() + ", kept in by Landlock " +
+                         features["landlock"].asString() +
+                         ", a filter of system calls, the rights of nobody, and limits");
 }
 
 }  // namespace quarrox::ctl::doctor

@@ -2,11 +2,17 @@
 // is seen whether it watches its configurations.
 #include <sys/stat.h>
 #include <sys/utsname.h>
+#include <unistd.h>
 
+#include <algorithm>
+#include <cstdio>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
+#include <iterator>
+#include <memory>
 #include <string>
+#include <string_view>
 #include <system_error>
 
 #include "common/error.h"
@@ -21,30 +27,64 @@ namespace {
 
 constexpr char kNotifyd[] = "vexonotifyd";
 
-std::string StartOf(const std::string& daemon) {
-  return IsDirExist("/run/systemd/system", false) ? "systemctl restart " + daemon : "start it as root: " + daemon;
+// What a process still runs though it was replaced on the disk: its program or the library; empty for neither.
+std::string ReplacedFile(const std::string& process) {
+  constexpr std::string_view kGone = " (deleted)";
+  std::error_code error;
+  std::string program = std::filesystem::read_symlink(process + "/exe", error).string();
+  if (program.ends_with(kGone)) return program.substr(0, program.size() - kGone.size());
+  std::ifstream maps(process + "/maps");
+  for (std::string line; std::getline(maps, line);) {
+    const size_t at = line.find('/');
+    const bool is_library = at != std::string::npos && line.find("/libfileindex.so", at) != std::string::npos;
+    if (is_library && line.ends_with(kGone)) return line.substr(at, line.size() - kGone.size() - at);
+  }
+  return {};
+}
+
+// What its very program says when asked, "fileindexd 0.1.0"; empty for one that is too old to, or not root's: nobody
+// else's program is run.
+std::string VersionOf(const std::string& process) {
+  struct stat info;
+  if (stat(process.c_str(), &info) != 0 || info.st_uid != 0 || geteuid() != 0) return {};
+  const std::unique_ptr<FILE, int (*)(FILE*)> output(popen((process + "/exe --version 2>/dev/null").c_str(), "re"),
+                                                     pclose);
+  char line[256] = "";
+  if (output == nullptr || fgets(line, sizeof(line), output.get()) == nullptr) return {};
+  std::string text = line;
+  while (!text.empty() && text.back() == '\n') text.pop_back();
+  return text;
 }
 
 // A daemon whose program was replaced since it started is another one than is installed.
-void ReportRunning(const std::string& daemon, pid_t pid, const std::string& what, Findings& findings) {
-  std::error_code error;
-  const std::string program = std::filesystem::read_symlink("/proc/" + std::to_string(pid) + "/exe", error).string();
-  if (program.ends_with(" (deleted)")) {
-    findings.Wrong(daemon + " still runs a program that was replaced on the disk, process " + std::to_string(pid),
-                   StartOf(daemon));
+void ReportRunning(const std::string& daemon, pid_t pid, const std::string& what, Machine& machine,
+                   Findings& findings) {
+  machine.daemons[daemon] = pid;
+  const std::string process = "/proc/" + std::to_string(pid);
+  const std::string replaced = ReplacedFile(process);
+  const std::string version = VersionOf(process);
+  const std::string own = daemon + " " FILEINDEX_VERSION;
+  if (!replaced.empty()) {
+    findings.Wrong(daemon + " still runs " + replaced + " as it was before it was replaced on the disk, process " +
+                       std::to_string(pid),
+                   RestartCommand(daemon, pid));
+  } else if (geteuid() == 0 && version != own && !version.starts_with(own + ',')) {
+    findings.Wrong(daemon + " is of another version than fileindexctl " FILEINDEX_VERSION ": " +
+                       (version.empty() ? "one that does not tell it" : version) + ", process " + std::to_string(pid),
+                   RestartCommand(daemon, pid));
   } else {
-    findings.Well(daemon + ' ' + what + ", process " + std::to_string(pid));
+    findings.Well((version.empty() ? daemon : version) + ' ' + what + ", process " + std::to_string(pid));
   }
 }
 
 template <typename Ask>
-void CheckAnswers(const std::string& daemon, const Ask& ask, Findings& findings) {
+void CheckAnswers(const std::string& daemon, const Ask& ask, Machine& machine, Findings& findings) {
   try {
     const DaemonAnswer answer = ask();
-    if (answer.object["success"].asBool()) return ReportRunning(daemon, answer.daemon, "answers", findings);
+    if (answer.object["success"].asBool()) return ReportRunning(daemon, answer.daemon, "answers", machine, findings);
     findings.Wrong(daemon + " refuses: " + toString(answer.object["error"]), "sudo fileindexctl doctor");
   } catch (const Error& error) {
-    findings.Wrong(daemon + " does not serve: " + error.reason, StartOf(daemon));
+    findings.Wrong(daemon + " does not serve: " + error.reason, RestartCommand(daemon, 0));
   }
 }
 
@@ -85,7 +125,23 @@ pid_t FindNotifyd() {
   return 0;
 }
 
+// Whether systemd runs and knows the daemon.
+bool IsService(const std::string& daemon) {
+  constexpr const char* kUnits[] = {"/etc/systemd/system/", "/usr/local/lib/systemd/system/",
+                                    "/usr/lib/systemd/system/"};
+  const auto has_unit = [&](const std::string& directory) { return IsFileExist(directory + daemon + ".service"); };
+  return IsDirExist("/run/systemd/system", false) && std::any_of(std::begin(kUnits), std::end(kUnits), has_unit);
+}
+
 }  // namespace
+
+std::string RestartCommand(const std::string& daemon, pid_t pid) {
+  if (IsService(daemon)) return ShellLine({"systemctl", "restart", daemon});
+  std::string start = ShellLine({"setsid", "-f", daemon});
+  const std::string number = std::to_string(pid);
+  if (pid == 0) return start;
+  return "kill " + number + "; while kill -0 " + number + " 2>/dev/null; do sleep 0.1; done; " + start;
+}
 
 void CheckVersions(Machine&, Findings& findings) {
   utsname kernel = {};
@@ -98,16 +154,16 @@ void CheckDaemons(Machine& machine, Findings& findings) {
   look_at_list["type"] = "notify_setting_changed";
   look_at_list["data"]["share_name"] = "";  // no share's
   CheckAnswers(
-      "fileindexd", [&] { return Exchange(fileindex::kDaemonSocketPath, look_at_list); }, findings);
+      "fileindexd", [&] { return Exchange(fileindex::kDaemonSocketPath, look_at_list); }, machine, findings);
   Json::Value nothing;
   nothing["compound"] = Json::arrayValue;
   CheckAnswers(
-      "vexoelasticd", [&] { return machine.AskEngine(nothing); }, findings);
+      "vexoelasticd", [&] { return machine.AskEngine(nothing); }, machine, findings);
   if (const pid_t pid = FindNotifyd(); pid != 0) {
-    ReportRunning(kNotifyd, pid, std::string("watches ") + kMonitorDirectory, findings);
+    ReportRunning(kNotifyd, pid, std::string("watches ") + kMonitorDirectory, machine, findings);
   } else {
     findings.Wrong(std::string("no ") + kNotifyd + " watches " + kMonitorDirectory + ", so no change is seen",
-                   StartOf(kNotifyd));
+                   RestartCommand(kNotifyd, 0));
   }
 }
 

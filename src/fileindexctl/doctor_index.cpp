@@ -58,7 +58,8 @@ void CheckIndex(const std::string& name, Machine& machine, Findings& findings) {
   } else if (state.code == kElasticdIndexOpening || state.code == kElasticdIndexRecovering) {
     findings.Well("the index of the share " + name + " is about to be served: " + state.reason);
   } else if (IsElasticdBusy(state.code)) {
-    findings.Wrong("vexoelasticd has too much to do: " + state.reason, "wait, then run: fileindexctl doctor");
+    findings.Wrong("vexoelasticd has too much to do: " + state.reason, "wait, then run: fileindexctl doctor",
+                   Remedy::kByHand);
   } else if (state.code != 0 && state.code != kElasticdIndexPaused) {
     findings.Wrong(begin + "the engine cannot serve its index: " + state.reason, RebuildCommand(name, paused));
   }
@@ -112,6 +113,9 @@ void CheckIndexes(Machine& machine, Findings& findings) {
 }
 
 void CheckMonitors(Machine& machine, Findings& findings) {
+  for (const std::string& file : machine.damaged_monitors()) {
+    findings.Wrong(file + " is damaged, so it has nothing watched", ShellLine({"rm", file}));
+  }
   for (const std::string& name : machine.served()) CheckMonitor(name, machine, findings);
   findings.WellIfNothing("what is to be watched is what the folder list says");
 }

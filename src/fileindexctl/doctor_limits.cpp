@@ -2,6 +2,7 @@
 #include <fcntl.h>
 #include <sys/fanotify.h>
 #include <sys/inotify.h>
+#include <sys/resource.h>
 #include <sys/statvfs.h>
 
 #include <algorithm>
@@ -30,6 +31,9 @@ constexpr uint64_t kSpareInstances = 32;
 
 // One watch a directory: what serves a large file server where fanotify does not.
 constexpr uint64_t kManyWatches = 524288;
+
+// What Linux gives by itself; an index takes ten and each of its clients one.
+constexpr rlim_t kEnoughFiles = 1024;
 
 uint64_t ReadLimit(const char* name) {
   uint64_t limit = 0;
@@ -62,21 +66,22 @@ uint64_t SizeOf(const std::string& directory) {
   return size;
 }
 
-struct Volume {
-  uint64_t indexes = 0;
-  uint64_t bytes = 0;  // of all of them
-};
+using Volume = std::map<std::string, uint64_t>;  // the bytes of the shares' indexes
 
 void ReportNoRoom(const std::string& share, const std::string& volume, Findings& findings) {
   findings.Wrong("the index of the share " + share + " has less than 100 MiB left on " + volume,
-                 "make room there, or raise the quota that leaves none");
+                 "make room there, or raise the quota that leaves none", Remedy::kByHand);
 }
 
 std::string Describe(const std::string& path, const Volume& volume) {
   struct statvfs info;
   const bool known = statvfs((path + '/').c_str(), &info) == 0;
-  return path + ": " + (known ? SizeText(uint64_t{info.f_bavail} * info.f_frsize) : "an unknown size") +
-         " free; indexes: " + std::to_string(volume.indexes) + ", " + SizeText(volume.bytes);
+  std::string text =
+      path + ": " + (known ? SizeText(uint64_t{info.f_bavail} * info.f_frsize) : "an unknown size") + " free; indexes:";
+  for (const auto& [share, bytes] : volume) {
+    text += (share == volume.begin()->first ? " " : ", ") + share + " " + SizeText(bytes);
+  }
+  return text;
 }
 
 void ReportWithoutFanotify(const std::string& share, const std::string& why, Findings& findings) {
@@ -106,6 +111,18 @@ void CheckInotify(Machine& machine, Findings& findings) {
                          " watches are allowed");
 }
 
+void CheckLimits(Machine& machine, Findings& findings) {
+  for (const auto& [name, pid] : machine.daemons) {
+    rlimit limit = {};
+    if (prlimit(pid, RLIMIT_NOFILE, nullptr, &limit) != 0 || limit.rlim_cur >= kEnoughFiles) continue;
+    const std::string raise =
+        ShellLine({"prlimit", "--pid", std::to_string(pid), "--nofile=" + std::to_string(kEnoughFiles) + ':'});
+    findings.Wrong(name + " may have no more than " + std::to_string(limit.rlim_cur) + " files open, which is little",
+                   limit.rlim_max < kEnoughFiles ? RestartCommand(name, pid) : raise);
+  }
+  findings.WellIfNothing("the daemons may have enough files open");
+}
+
 void CheckFanotify(Machine& machine, Findings& findings) {
   for (const std::string& name : machine.served()) {
     const std::string why = WhyNoFanotify(machine.Share(name).GetPath());
@@ -119,8 +136,7 @@ void CheckRoom(Machine& machine, Findings& findings) {
   for (const std::string& name : machine.served()) {
     const sdk::SDKShare& share = machine.Share(name);
     const std::string volume = Dirname(share.GetPath());
-    ++volumes[volume].indexes;
-    volumes[volume].bytes += SizeOf(share.GetDBPath());
+    volumes[volume][name] = SizeOf(share.GetDBPath());
     if (!share.IsSpaceEnough()) ReportNoRoom(name, volume, findings);
   }
   for (const auto& [path, volume] : volumes) findings.Well(Describe(path, volume));

@@ -90,11 +90,18 @@ DaemonAnswer Machine::AskEngine(const Json::Value& request) {
 const std::map<std::string, MonitorConfig>& Machine::monitors() {
   if (monitors_) return *monitors_;
   std::map<std::string, MonitorConfig> monitors;
+  damaged_monitors_.clear();
   std::error_code error;
   for (fs::directory_iterator file(kMonitorDirectory, error), end; !error && file != end; file.increment(error)) {
     std::string queue;
     MonitorConfig config;
-    if (file->path().extension() == ".json" && Read(file->path().string(), queue, config)) monitors[queue] = config;
+    const std::string name = file->path().string();
+    if (!name.ends_with(".json")) continue;
+    if (Read(name, queue, config)) {
+      monitors[queue] = config;
+    } else if (Json::Value object; IsFileExist(name) && !fromFile(object, name)) {
+      damaged_monitors_.push_back(name);
+    }
   }
   if (error && error != std::errc::no_such_file_or_directory) {
     throw Error(kErrSystem, std::string("reading ") + kMonitorDirectory + " failed, reason=" + error.message());

@@ -12,6 +12,7 @@
 
 #include "common/comm.h"
 #include "common/sdk/share.h"
+#include "common/search_socket.h"
 #include "common/strings.h"
 #include "doctor.h"
 #include "fileindex/communication.h"
@@ -22,6 +23,8 @@
 
 namespace quarrox::ctl::doctor {
 namespace {
+
+constexpr char kEngineDirectory[] = "/var/lib/vexoelasticd";
 
 constexpr char kService[] = "Quarrox";  // its user and its group
 
@@ -77,13 +80,30 @@ void CheckGroup(const std::string& path, Findings& findings) {
                  ShellLine({"chgrp", kService, path}));
 }
 
+// It is root's, or the service's as the directory is.
+void CheckQueue(const std::string& path, Findings& findings) {
+  struct stat info;
+  if (lstat(path.c_str(), &info) != 0) return;
+  if (S_ISREG(info.st_mode)) {
+    CheckRule({path, 0600, 0077, "0600", true}, findings);
+  } else {
+    findings.Wrong("the queue " + path + " is no file, so no change is taken",
+                   ShellLine({"mv", path, path + ".set-aside"}));
+  }
+}
+
 }  // namespace
 
-void CheckSockets(Machine&, Findings& findings) {
+void CheckSockets(Machine& machine, Findings& findings) {
   for (const char* path : {fileindex::kDaemonSocketPath, kElasticdSocketPath}) {
     if (CheckRule({path, 0660, 0117, "0660"}, findings)) CheckGroup(path, findings);
   }
-  findings.WellIfNothing("only root and the service reach the daemons");
+  const auto engine = machine.daemons.find("vexoelasticd");
+  if (!CheckRule({kSearchSocketPath, 0666, 0111, "0666"}, findings) && engine != machine.daemons.end()) {
+    findings.Wrong(std::string(kSearchSocketPath) + " is missing, so ordinary users cannot search",
+                   RestartCommand(engine->first, engine->second));
+  }
+  findings.WellIfNothing("everybody may search, and only root and the service reach the daemons otherwise");
 }
 
 // Who writes a configuration tells root's daemons what to do; an index and a queue hold everybody's text and names.
@@ -92,12 +112,14 @@ void CheckRights(Machine& machine, Findings& findings) {
                              {fileindex::kFileIndexFoldersCfgPath, 0644, 0022, "0644"},
                              {fileindex::kFileIndexStatusCfgPath, 0644, 0022, "0644"},
                              {fileindex::kFolderPausesPath, 0644, 0022, "0644"},
+                             {kEngineDirectory, 0700, 0077, "0700"},
                              {kMonitorDirectory, 0700, 0022, "0755"}};
   for (const Rule& rule : rules) CheckRule(rule, findings);
   for (const std::string& name : machine.served()) {
     const sdk::SDKShare& share = machine.Share(name);
     std::set<std::string> directories = {share.GetDBPath(), Dirname(share.GetDBPath()), Dirname(share.GetQueuePath())};
     for (const std::string& directory : directories) CheckRule({directory, 0700, 0077, "0700", true}, findings);
+    for (const char* suffix : {"", ".tmp"}) CheckQueue(share.GetQueuePath() + suffix, findings);
   }
   findings.WellIfNothing("configurations, indexes and queues are in the right hands");
 }

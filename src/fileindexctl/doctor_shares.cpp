@@ -6,6 +6,7 @@
 #include "common/strings.h"
 #include "doctor.h"
 #include "fileindex/folder_mgr.h"
+#include "fileindex/index_scope.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
 #include "refusal.h"
@@ -25,14 +26,29 @@ std::string RemoveCommand(const std::string& name, const std::string& place, Mac
 
 void ReportGone(const std::string& name, bool is_list_doubtful, Machine& machine, Findings& findings) {
   std::string command = RemoveCommand(name, "", machine);
-  if (command.empty()) {
+  const bool is_untold = command.empty();
+  if (is_untold) {
     command = ShareCommand("clear-paused", name, "PATH") + ", where PATH is the directory that it had";
   }
   findings.Wrong(
       "there are indexed folders in the share " + name +
           ", which is not configured; configure it again; where it was renamed, say so with 'fileindexctl "
           "share rename'; only where it is gone for good, remove its folders and its index",
-      is_list_doubtful ? "mend the mistakes in shares.conf first; if it is gone all the same: " + command : command);
+      is_list_doubtful ? "mend the mistakes in shares.conf first; if it is gone all the same: " + command : command,
+      is_list_doubtful || is_untold ? Remedy::kByHand : Remedy::kCommand);
+}
+
+// A share whose directory is not there, or not the disk that it was.
+void ReportAway(const std::string& name, Findings& findings) {
+  try {
+    fileindex::IndexScope(name).Read();
+  } catch (const Error& error) {
+    const size_t split = error.reason.find("; ");
+    findings.Wrong(error.reason.substr(0, split),
+                   split == std::string::npos ? "put the share's directory back, or: " + ShareCommand("pause", name)
+                                              : error.reason.substr(split + 2),
+                   Remedy::kByHand);
+  }
 }
 
 }  // namespace
@@ -42,9 +58,9 @@ void CheckConfiguration(Machine&, Findings& findings) {
   for (const std::string& problem : sdk::SDKShare::ConfigProblems()) {
     const size_t split = problem.rfind("; ");
     if (split == std::string::npos) {
-      findings.Wrong(problem, "mend it there");
+      findings.Wrong(problem, "mend it there", Remedy::kByHand);
     } else {
-      findings.Wrong(problem.substr(0, split), problem.substr(split + 2));
+      findings.Wrong(problem.substr(0, split), problem.substr(split + 2), Remedy::kByHand);
     }
   }
   findings.WellIfNothing("the shares are configured without mistakes");
@@ -67,7 +83,9 @@ void CheckShares(Machine& machine, Findings& findings) {
                          share.GetPath() + "; give both the same name, or remove its folders and its index",
                      RemoveCommand(name, share.GetPath(), machine));
     } else if (refusal) {
-      findings.Wrong(refusal.reason, refusal.remedy + ", or: " + ShareCommand("pause", name));
+      findings.Wrong(refusal.reason, refusal.remedy + ", or: " + ShareCommand("pause", name), Remedy::kByHand);
+    } else {
+      ReportAway(name, findings);
     }
   }
   findings.WellIfNothing("the shares of all indexed folders are there");
@@ -77,7 +95,7 @@ void CheckShares(Machine& machine, Findings& findings) {
 void CheckFolders(Machine& machine, Findings& findings) {
   if (const auto bad = machine.folders().find(""); bad != machine.folders().end()) {
     findings.Wrong("the path \"" + bad->second.front()->GetPath() + "\" of the folder list names no share",
-                   std::string("take its record out of ") + fileindex::kFileIndexFoldersCfgPath);
+                   std::string("take its record out of ") + fileindex::kFileIndexFoldersCfgPath, Remedy::kByHand);
   }
   for (const std::string& name : machine.served()) {
     for (const auto& folder : machine.folders().at(name)) {

@@ -1,10 +1,6 @@
-#include <unistd.h>
+#include "explain.h"
 
-#include <ctime>
-#include <iostream>
-#include <memory>
-#include <optional>
-#include <string>
+#include <algorithm>
 
 #include "command.h"
 #include "common/comm.h"
@@ -13,35 +9,24 @@
 #include "common/json.h"
 #include "common/sdk/share.h"
 #include "common/sdk/share_path.h"
+#include "daemon_exchange.h"
 #include "fileindex/folder_pauses.h"
-#include "fileindex/index_failures.h"
 #include "fileindex/index_scope.h"
 #include "fileindex/queue_mgr.h"
+#include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
 #include "output.h"
-#include "refusal.h"
+#include "status.h"
 
 namespace quarrox::ctl {
 namespace {
 
+constexpr char kDirectory[] = "directory";
 constexpr const char* kFileTypeNames[] = {"document", "audio", "video", "photo", "other"};
 
-// What became of a path that can be indexed. What cannot be told is absent.
-struct Fate {
-  std::optional<bool> is_pending = std::nullopt;
-  std::optional<bool> is_indexed = std::nullopt;
-  std::optional<fileindex::IndexFailure> failure = std::nullopt;
-  std::shared_ptr<fileindex::Folder> paused = nullptr;  // the folder that it is in, where that is paused
-};
-
-struct Explanation {
-  std::string path = {};        // on its volume
-  std::string share = {};       // empty where no share holds it
-  std::string share_path = {};  // as users see it; empty likewise
-  std::string file_type = {};
-  Refusal refusal = {};
-  Fate fate = {};
-};
+// What the engine tells of a document beside its fields.
+constexpr char kIndexedAt[] = "@indexed";
+constexpr char kTextBytes[] = "@text_bytes";
 
 bool HasShare(const std::string& full_path, std::string& share) {
   try {
@@ -65,150 +50,131 @@ std::string AsFullPath(const std::string& typed) {
   }
 }
 
-// With one exchange, not with the library's call, which waits for an engine that is not ready.
-std::optional<bool> IsIndexed(const sdk::SDKShare& share, const std::string& path) {
-  if (access(kElasticdSocketPath, F_OK) != 0) return std::nullopt;
+// As a search, which waits for no change that is under way. An engine that does not answer leaves all of it untold.
+void AskEngine(const std::string& index_id, const std::string& path, Fate& fate) {
   Json::Value request;
   request["command"] = "document_get_by_query";
-  request["data"]["id"] = share.GetDBName();
-  request["data"]["query"]["qsl"]["term"]["VEXOMDPath"] = path;
-  request["data"]["query"]["load_field"].append("VEXOMDPath");
+  request["data"]["id"] = index_id;
+  Json::Value& query = request["data"]["query"];
+  query["qsl"]["bool"]["must"]["term"]["VEXOMDPath"] = path;
+  for (const char* field : {"VEXOMDPath", kIndexedAt, kTextBytes}) query["load_field"].append(field);
   try {
-    Json::Value response;
-    SendRequestImpl(response, request);
-    return response["data"].isArray() && !response["data"].empty();
-  } catch (const Error& error) {
-    if (int{error.code} == kElasticdNoSuchIndex) return false;
-    return std::nullopt;
+    const Json::Value answer = Exchange(kElasticdSocketPath, request).object;
+    if (!answer["success"].asBool()) {
+      const Json::Value& code = answer["error"]["code"];
+      if (code.isInt() && code.asInt() == kElasticdNoSuchIndex) fate.is_indexed = false;
+      return;
+    }
+    const Json::Value& found = answer["data"];
+    fate.is_indexed = found.isArray() && !found.empty();
+    if (!*fate.is_indexed) return;
+    const Json::Value& document = found[0];
+    if (document[kIndexedAt].isInt64()) fate.indexed_at = document[kIndexedAt].asInt64();
+    if (document[kTextBytes].isUInt64()) fate.text_bytes = document[kTextBytes].asUInt64();
+  } catch (const Error&) {
+    return;
   }
 }
 
-// Null where it is not paused, or that cannot be told.
-std::shared_ptr<fileindex::Folder> PausedFolderOf(const std::string& path, const std::string& share) {
-  fileindex::IndexScope scope(share);
+// What of its share keeps a path waiting.
+std::string StateOf(const std::string& share) {
+  try {
+    const IndexingStatus status = LookAtIndexing(false);
+    const auto found = std::ranges::find(status.shares, share, &ShareStatus::name);
+    return found == status.shares.end() ? "" : Describe(*found);
+  } catch (const Error&) {
+    return {};
+  }
+}
+
+std::string PauseOf(const fileindex::Folder& folder) {
+  const std::optional<int64_t> end = fileindex::FolderPauses().EndOf(folder);
+  return !end ? "with its share " + folder.GetShare() : folder.GetPath() + " is " + DescribePause(*end);
+}
+
+// Null, and not paused, where no folder governs the path, or that cannot be told.
+void FindFolder(Explanation& result) {
+  fileindex::IndexScope scope(result.share);
   try {
     scope.Read();
-    return scope.IsPaused(path) ? scope.FolderOf(path) : nullptr;
+    result.folder = scope.FolderOf(result.path);
+    result.wants_contents = result.file_type != kDirectory && scope.NeedsMeta(result.path);
+    if (result.folder != nullptr && scope.IsPaused(result.path)) result.fate.paused = PauseOf(*result.folder);
   } catch (const Error&) {
-    return nullptr;
+    result.is_folder_known = false;
   }
 }
 
-Fate FateOf(const std::string& path, const std::string& share_name) {
+void FindFate(const std::string& path, const std::string& share_name, Fate& fate) {
   const sdk::SDKShare share(share_name);
-  Fate fate;
   try {
     fate.is_pending = fileindex::QueueMgr(share.GetQueuePath()).IsFullPathPending(path);
   } catch (const Error&) {
     // It was logged why.
   }
-  fate.is_indexed = IsIndexed(share, path);
-  fate.paused = PausedFolderOf(path, share_name);
+  if (fate.is_pending.value_or(false)) fate.share_state = StateOf(share_name);
+  AskEngine(share.GetDBName(), path, fate);
   const fileindex::IndexFailures failures(fileindex::IndexFailures::FileOf(share));
   if (const auto* failure = failures.Find(path.substr(share.GetPath().size()))) fate.failure = *failure;
-  return fate;
 }
 
-Explanation Explain(const std::string& typed) {
-  Explanation result;
-  result.path = AsFullPath(typed);
-  if (HasShare(result.path, result.share)) {
-    result.share_path = sdk::SharePathMgr::GetSharePath(result.path, sdk::User(), false);
+std::string ResumeCommand(const fileindex::Folder& folder) {
+  if (fileindex::FolderPauses().EndOf(folder)) return ShellLine({"fileindexctl", "folder", "resume", folder.GetPath()});
+  return ShareCommand("resume", folder.GetShare());
+}
+
+bool IsAllPaused() {
+  const int64_t resume_time = fileindex::StatusMgr().GetPauseInfo();
+  return resume_time == fileindex::kPausedWithoutEnd || resume_time > time(nullptr);
+}
+
+std::string TypesCommand(const Explanation& result) {
+  const std::string types = TypesOf(*result.folder);
+  return ShellLine({"fileindexctl", "folder", "set", result.folder->GetPath(), "--types",
+                    (types == "none" ? "" : types + ',') + result.file_type});
+}
+
+std::string RemedyFor(const Explanation& result) {
+  const Fate& fate = result.fate;
+  if (result.refusal) return result.refusal.remedy;
+  if (!result.is_folder_known) return "fileindexctl doctor";
+  if (result.folder == nullptr) return ShellLine({"fileindexctl", "folder", "add", '/' + result.share});
+  if (!fate.paused.empty()) return ResumeCommand(*result.folder);
+  if (fate.is_pending.value_or(false) && IsAllPaused()) return "fileindexctl resume";
+  if (!fate.is_pending || !fate.is_indexed) return "fileindexctl doctor";
+  if (fate.failure) return "put right what it says, then: " + ShellLine({"touch", result.path});
+  if (!*fate.is_pending && !*fate.is_indexed) {
+    return ShellLine({"fileindexctl", "folder", "reindex", result.folder->GetPath()});
   }
-  result.file_type =
-      IsDirExist(result.path, false) ? "directory" : kFileTypeNames[fileindex::GetFileTypeByFullPath(result.path)];
-  result.refusal = RefusalOf(result.path);
-  if (!result.refusal) result.fate = FateOf(result.path, result.share);
-  return result;
-}
-
-Json::Value AsJson(const std::optional<bool>& answer) {
-  return answer ? Json::Value(*answer) : Json::Value();
-}
-
-Json::Value AsJson(const fileindex::IndexFailure& failure) {
-  Json::Value object;
-  object["code"] = failure.code;
-  object["reason"] = failure.reason;
-  object["tried"] = Json::Int64{failure.tried};
-  object["tries"] = failure.tries;
-  const std::optional<int64_t> next = failure.NextTry();
-  object["next_try"] = next ? Json::Value(Json::Int64{*next}) : Json::Value();
-  return object;
-}
-
-void PrintJson(const Explanation& explanation) {
-  Json::Value object;
-  object["path"] = explanation.path;
-  object["share"] = explanation.share;
-  object["share_path"] = explanation.share_path;
-  object["file_type"] = explanation.file_type;
-  object["indexable"] = !explanation.refusal;
-  Describe(explanation.refusal, object);
-  object["pending"] = AsJson(explanation.fate.is_pending);
-  object["indexed"] = AsJson(explanation.fate.is_indexed);
-  object["paused"] = explanation.fate.paused != nullptr;
-  object["failure"] = explanation.fate.failure ? AsJson(*explanation.fate.failure) : Json::Value();
-  std::cout << toString(object) << '\n';
-}
-
-const char* Describe(const std::optional<bool>& answer) {
-  return !answer ? "cannot be told" : *answer ? "yes" : "no";
-}
-
-std::string TimeOf(time_t time) {
-  tm parts = {};
-  char text[32] = "";
-  if (localtime_r(&time, &parts) != nullptr) strftime(text, sizeof(text), "%F %T", &parts);
-  return text;
-}
-
-void PrintPause(const fileindex::Folder& folder) {
-  const std::optional<int64_t> end = fileindex::FolderPauses().EndOf(folder);
-  std::cout << "paused     "
-            << Visible(!end ? "with its share " + folder.GetShare() : folder.GetPath() + " is " + DescribePause(*end))
-            << '\n';
-}
-
-void Print(const Fate& fate) {
-  const std::optional<fileindex::IndexFailure>& failure = fate.failure;
-  const bool lacks_contents = failure && failure->has_document && fate.is_indexed.value_or(false);
-  std::cout << "pending    " << Describe(fate.is_pending) << '\n';
-  std::cout << "indexed    " << Describe(fate.is_indexed) << (lacks_contents ? ", without its contents" : "") << '\n';
-  if (fate.paused != nullptr) PrintPause(*fate.paused);
-  if (!failure) return;
-  const std::optional<int64_t> next = failure->NextTry();
-  std::cout << "failed     " << TimeOf(failure->tried) << ": " << Visible(failure->reason) << " (code " << failure->code
-            << ")\n";
-  std::cout << "next try   " << (next ? TimeOf(*next) : "when it changes, or a reindex asks for it") << '\n';
-}
-
-void PrintText(const Explanation& explanation) {
-  std::cout << "path       " << Visible(explanation.path) << '\n';
-  std::cout << "share      "
-            << (explanation.share.empty() ? "none" : Visible(explanation.share + " (" + explanation.share_path + ")"))
-            << '\n';
-  std::cout << "type       " << explanation.file_type << '\n';
-  if (!explanation.refusal) {
-    std::cout << "indexable  yes\n";
-    return Print(explanation.fate);
-  }
-  std::cout << "indexable  no: " << Visible(explanation.refusal.reason) << " (rule " << explanation.refusal.rule
-            << ")\n";
-  std::cout << "remedy     " << Visible(explanation.refusal.remedy) << '\n';
+  const bool is_left_out = result.file_type != kDirectory && !result.wants_contents;
+  return is_left_out ? TypesCommand(result) : "";
 }
 
 }  // namespace
 
+Explanation Explain(const std::string& typed, const std::string& user) {
+  Explanation result;
+  result.path = AsFullPath(typed);
+  result.file_type =
+      IsDirExist(result.path, false) ? kDirectory : kFileTypeNames[fileindex::GetFileTypeByFullPath(result.path)];
+  if (HasShare(result.path, result.share)) {
+    result.share_path = sdk::SharePathMgr::GetSharePath(result.path, sdk::User(), false);
+    FindFolder(result);
+  }
+  result.refusal = RefusalOf(result.path);
+  if (!result.refusal) FindFate(result.path, result.share, result.fate);
+  result.remedy = RemedyFor(result);
+  result.readers = ReadersOf(result.path);
+  result.user = user;
+  if (!user.empty()) result.access = AccessAs(user, result.path);
+  return result;
+}
+
 int ExplainPath(const Arguments& arguments) {
   const std::string& typed = arguments.operands().front();
   if (typed.empty()) throw UsageError("PATH is empty");
-  const Explanation explanation = Explain(typed);
-  if (arguments.Has("--json")) {
-    PrintJson(explanation);
-  } else {
-    PrintText(explanation);
-  }
+  const Explanation explanation = Explain(typed, arguments.Value("--as", ""));
+  arguments.Has("--json") ? PrintAsJson(explanation) : PrintAsText(explanation);
   return kDone;
 }
 

@@ -24,16 +24,6 @@ const std::vector<std::string>& SortKeys() {
   return keys;
 }
 
-// The kinds of files that a folder indexes; "none" where there are none.
-std::string TypesOf(const Folder& folder) {
-  std::string types;
-  for (const auto& [has, type] : {std::pair(folder.HasDocument(), "document"), std::pair(folder.HasAudio(), "audio"),
-                                  std::pair(folder.HasVideo(), "video"), std::pair(folder.HasPhoto(), "photo")}) {
-    if (has) types.append(types.empty() ? "" : ",").append(type);
-  }
-  return types.empty() ? "none" : types;
-}
-
 const char* YesNo(bool value) {
   return value ? "yes" : "no";
 }
@@ -65,6 +55,15 @@ Json::Value AsJson(const Folder& folder, const FolderPauses& pauses) {
 }
 
 }  // namespace
+
+std::string TypesOf(const Folder& folder) {
+  std::string types;
+  for (const auto& [has, type] : {std::pair(folder.HasDocument(), "document"), std::pair(folder.HasAudio(), "audio"),
+                                  std::pair(folder.HasVideo(), "video"), std::pair(folder.HasPhoto(), "photo")}) {
+    if (has) types.append(types.empty() ? "" : ",").append(type);
+  }
+  return types.empty() ? "none" : types;
+}
 
 int FolderList(const Arguments& arguments) {
   const std::string sort_by = arguments.Value("--sort", "path");

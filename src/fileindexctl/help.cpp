@@ -13,9 +13,10 @@ namespace {
 
 // What each option does, whichever command takes it.
 const std::pair<const char*, const char*> kOptionTexts[] = {
-    {"--as=", "as this user, leaving out what they may not read; only root may name another one"},
+    {"--as=", "as this user sees it, whose rights then count"},
     {"--complete", "print what a shell can complete the last of the words to"},
     {"--desc", "the last first"},
+    {"--failed", "only what could not be read, file by file, and when it is tried again"},
     {"--follow", "go on and show each change, until Ctrl-C"},
     {"--group=", "the folders' group, which is any name"},
     {"--json", "print one JSON object, or one a line for listings"},

@@ -28,6 +28,7 @@ int Usage(const std::string& what) {
 // What a person may make of an error's number; empty where the reason says all.
 const char* MeaningOf(int code) {
   static const std::map<int, const char*> meanings = {
+      {quarrox::kErrJsonLoad, "a file of the system is damaged; 'fileindexctl doctor' says what to do"},
       {quarrox::kErrShareEnum, "the shares cannot be listed"},
       {quarrox::kErrNoSuchShare, "there is no such share"},
       {quarrox::kErrFolderExists, "the folder is indexed already"},

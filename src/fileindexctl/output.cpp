@@ -30,7 +30,35 @@ size_t HarmfulAt(std::string_view text) {
   return byte(0) == 0xe2 && is_turn ? 3 : 0;
 }
 
+bool IsPlain(char c) {
+  return ('a' <= c && c <= 'z') || ('A' <= c && c <= 'Z') || ('0' <= c && c <= '9') ||
+         std::string("/._-+=:,@%").find(c) != std::string::npos;
+}
+
 }  // namespace
+
+std::string ShellLine(const std::vector<std::string>& words) {
+  std::string line;
+  for (const std::string& word : words) {
+    if (!line.empty()) line += ' ';
+    if (!word.empty() && std::all_of(word.begin(), word.end(), IsPlain)) {
+      line += word;
+      continue;
+    }
+    line += '\'';
+    for (const char c : word) c == '\'' ? line += "'\\''" : line += c;
+    line += '\'';
+  }
+  return line;
+}
+
+std::string ShareCommand(const std::string& verb, const std::string& share, const std::string& operand) {
+  std::vector<std::string> words = {"fileindexctl", "share", verb};
+  if (share.starts_with('-')) words.emplace_back("--");
+  words.push_back(share);
+  if (!operand.empty()) words.push_back(operand);
+  return ShellLine(words);
+}
 
 std::string Visible(const std::string& text) {
   static constexpr char kHex[] = "0123456789abcdef";

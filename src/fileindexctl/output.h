@@ -6,10 +6,23 @@
 #include <string>
 #include <vector>
 
+namespace quarrox::fileindex {
+class Folder;
+}
+
 namespace quarrox::ctl {
+
+// The kinds of files that a folder indexes, with commas between them; "none" where there are none.
+std::string TypesOf(const fileindex::Folder& folder);
 
 // A text that stays on one line and cannot drive the terminal: control bytes come out as \n, \x1b and so on.
 std::string Visible(const std::string& text);
+
+// A command for the shell, each word quoted where it has to be.
+std::string ShellLine(const std::vector<std::string>& words);
+
+// "fileindexctl share VERB SHARE [OPERAND]".
+std::string ShareCommand(const std::string& verb, const std::string& share, const std::string& operand = "");
 
 // A number of bytes: "17 B", "4.2 MiB".
 std::string SizeText(uint64_t bytes);

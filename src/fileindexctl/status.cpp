@@ -18,7 +18,9 @@
 #include "common/comm.h"
 #include "common/error.h"
 #include "common/file.h"
+#include "common/json.h"
 #include "common/sdk/open_shares.h"
+#include "common/strings.h"
 #include "common/unique_fd.h"
 #include "daemon_exchange.h"
 #include "fileindex/communication.h"
@@ -26,6 +28,7 @@
 #include "fileindex/folder_mgr.h"
 #include "fileindex/folder_pauses.h"
 #include "fileindex/folder_status.h"
+#include "fileindex/index_failures.h"
 #include "fileindex/queue_mgr.h"
 #include "fileindex/status_mgr.h"
 #include "output.h"
@@ -36,6 +39,12 @@ namespace {
 
 using fileindex::IndexProgress;
 using State = ShareStatus::State;
+
+bool IsProcess(int64_t pid, const char* expected) {
+  if (pid <= 0 || (kill(static_cast<pid_t>(pid), 0) != 0 && errno != EPERM)) return false;
+  std::string name;
+  return std::getline(std::ifstream("/proc/" + std::to_string(pid) + "/comm"), name) && name == expected;
+}
 
 // Whether a stream socket listens at a path. A socket of another type is told apart from nobody, and its try disturbs
 // no listener.
@@ -48,8 +57,16 @@ bool Listens(const char* path) {
          (errno != ENOENT && errno != ECONNREFUSED);
 }
 
+// Whether the notification daemon runs, which tells its process there.
+bool IsNotifydRunning() {
+  Json::Value status;
+  if (!fromFile(status, "/var/run/vexonotifyd.status") || !status.isObject()) return false;
+  return status["pid"].isInt64() && IsProcess(status["pid"].asInt64(), "vexonotifyd");
+}
+
 // What concerns all shares.
 struct Machine {
+  bool notifyd_runs = IsNotifydRunning();
   bool daemon_runs = Listens(fileindex::kDaemonSocketPath);
   fileindex::StatusMgr status = {};
   fileindex::FolderPauses pauses = {};
@@ -74,28 +91,39 @@ void Set(ShareStatus& share, State state, const std::string& reason = {}) {
   share.reason = reason;
 }
 
+// What a worker failed at, in words for people where they are known.
+std::string WhyWaits(const ShareStatus& share, const sdk::SDKShare& opened) {
+  constexpr char kNoEngine[] = "Connect failed";  // as the channel to the engine says it
+  if (share.progress.reason == kNoEngine) return "the search engine, vexoelasticd, did not answer; it is asked again";
+  if (opened.IsSpaceEnough()) return share.progress.reason;
+  return "less than 100 MiB are left for its index on " + Dirname(opened.GetPath()) + "; make room there";
+}
+
 // The first that holds of what may keep a share from being indexed, then what is under way.
 void Judge(ShareStatus& share, const sdk::SDKShare& opened, bool is_paused, const Machine& machine) {
   const Refusal refusal = RefusalOf(opened);
   if (refusal) return Set(share, State::kBlocked, refusal.reason + "; " + refusal.remedy);
-  if (is_paused) return Set(share, State::kPaused, "paused; 'fileindexctl share resume " + share.name + "' ends it");
+  if (is_paused) return Set(share, State::kPaused, "paused; '" + ShareCommand("resume", share.name) + "' ends it");
   if (machine.IsPaused()) return Set(share, State::kPaused, DescribePause(machine.resume_time));
   const int flags = machine.status.GetShareStatus(share.name);
   if (share.progress.state == IndexProgress::State::kWorking) {
     share.rebuilding = (flags & fileindex::kShareNeedRebuild) != 0;
+    share.quiet = machine.now - share.progress.updated;
     return Set(share, State::kWorking);
   }
-  if (share.progress.state == IndexProgress::State::kWaiting) return Set(share, State::kWaiting, share.progress.reason);
+  if (share.progress.state == IndexProgress::State::kWaiting)
+    return Set(share, State::kWaiting, WhyWaits(share, opened));
   if (share.queue_age && !machine.daemon_runs) return Set(share, State::kWaiting, "fileindexd is not running");
   if (share.queue_age) return Set(share, State::kPending);
   if ((flags & fileindex::kShareNeedRebuild) != 0) {
-    return Set(share, State::kOutdated, "damaged; 'fileindexctl share rebuild " + share.name + "' makes it anew");
+    return Set(share, State::kOutdated, "damaged; '" + ShareCommand("rebuild", share.name) + "' makes it anew");
   }
   if (flags != 0) {
-    return Set(share, State::kOutdated, "incomplete; 'fileindexctl folder reindex /" + share.name + "' mends it");
+    return Set(share, State::kOutdated,
+               "incomplete; '" + ShellLine({"fileindexctl", "folder", "reindex", '/' + share.name}) + "' mends it");
   }
   if (!IsDirExist(opened.GetDBPath(), false)) {
-    Set(share, State::kOutdated, "not there; 'fileindexctl share rebuild " + share.name + "' makes it");
+    Set(share, State::kOutdated, "not there; '" + ShareCommand("rebuild", share.name) + "' makes it");
   }
 }
 
@@ -111,12 +139,30 @@ bool LookAt(ShareStatus& share, bool is_paused, const Machine& machine, sdk::Ope
       AddQueueFile(share, path, machine.now);
     }
     Judge(share, opened, is_paused, machine);
+    const fileindex::IndexFailures failures(fileindex::IndexFailures::FileOf(opened));
+    share.failures = failures.size() + failures.omitted();
     return true;
   } catch (const Error& error) {
     if (error.code != kErrNoSuchShare) throw;
     Set(share, State::kBlocked,
         "the share is gone; 'fileindexctl share clear-paused' takes its folders out of the list");
     return false;
+  }
+}
+
+// What the engine says of one index keeps its share from going on, or from being found.
+void TakeRefusal(ShareStatus& share, const Json::Value& error) {
+  int code = 0;
+  GetJsonValue(code, error, "code", false);
+  if (share.state == State::kPaused || share.state == State::kBlocked) return;
+  if (code == kElasticdIndexOpening || code == kElasticdIndexRecovering) {
+    Set(share, State::kWaiting, "the search engine is checking its index");
+  } else if (code == kElasticdIndexPaused) {
+    Set(share, State::kOutdated, "paused; '" + ShareCommand("resume", share.name) + "' ends that");
+  } else if (code == kElasticdNoSuchIndex && share.state == State::kCurrent) {
+    Set(share, State::kOutdated, "not there; '" + ShareCommand("rebuild", share.name) + "' makes it");
+  } else if (IsElasticdBusy(code)) {
+    Set(share, State::kWaiting, "the search engine has too much to do");
   }
 }
 
@@ -135,11 +181,15 @@ bool Ask(const std::vector<ShareStatus*>& shares) {
     request["compound"].append(item);
   }
   const Json::Value response = Exchange(kElasticdSocketPath, request).object;
-  if (!response["success"].asBool()) return false;
+  if (!response["success"].asBool()) {
+    if (shares.size() == 1) TakeRefusal(*shares.front(), response["error"]);
+    return false;
+  }
   const Json::Value& answers = response["data"];
   for (Json::ArrayIndex i = 0; i < std::min(answers.size(), static_cast<Json::ArrayIndex>(shares.size())); ++i) {
     const Json::Value& total = answers[i]["total"];
     if (total.isUInt64()) shares[i]->documents = total.asUInt64();
+    if (answers[i].isMember("error")) TakeRefusal(*shares[i], answers[i]["error"]);
   }
   return true;
 }
@@ -172,9 +222,7 @@ void AddFolders(IndexingStatus& status, const Machine& machine, const fileindex:
 }  // namespace
 
 bool IsWorker(int64_t pid) {
-  if (pid <= 0 || (kill(static_cast<pid_t>(pid), 0) != 0 && errno != EPERM)) return false;
-  std::string name;
-  return std::getline(std::ifstream("/proc/" + std::to_string(pid) + "/comm"), name) && name == "fileindexd";
+  return IsProcess(pid, "fileindexd");
 }
 
 IndexingStatus LookAtIndexing(bool with_folders) {
@@ -195,11 +243,14 @@ IndexingStatus LookAtIndexing(bool with_folders) {
     if (!LookAt(share, !served.contains(name), machine, shares)) folders.DeleteByShare(name);
   }
   if (!machine.daemon_runs) status.problems.emplace_back("fileindexd is not running, so nothing is indexed");
+  if (!machine.notifyd_runs) status.problems.emplace_back("vexonotifyd is not running, so no change is seen");
   try {
     CountDocuments(status, shares);
   } catch (const Error& error) {
-    status.problems.push_back("the search engine, vexoelasticd, does not work: " + error.reason);
+    status.problems.push_back("the search engine, vexoelasticd, does not work: " + error.reason +
+                              "; 'fileindexctl doctor' says what to do");
   }
+  for (ShareStatus& share : status.shares) share.problems = status.problems;
   if (with_folders) AddFolders(status, machine, folders, shares);
   return status;
 }

@@ -31,6 +31,9 @@ struct ShareStatus {
   std::optional<int64_t> queue_age = {};   // of the oldest of them, in seconds; none where there is no queue
   std::string progress_file = {};          // empty for a share that is gone
   size_t paused_folders = 0;               // while the share is not
+  uint64_t failures = 0;                   // files that the index lacks, or has without their contents
+  int64_t quiet = 0;                       // seconds for which a pass under way has told nothing
+  std::vector<std::string> problems = {};  // that concern all shares, as IndexingStatus has them
 
   struct Folder {
     std::string path;
@@ -67,6 +70,9 @@ std::string NameOf(ShareStatus::State state);
 std::string AsJson(const ShareStatus& share);
 std::string Describe(const ShareStatus& share);
 std::string DescribeLong(const ShareStatus& share, bool bar);
+
+// What could not be indexed, file by file. Returns the exit status.
+int PrintFailures(bool json);
 
 // Tables of the shares and their folders.
 void Print(const IndexingStatus& status);

@@ -13,6 +13,11 @@ namespace {
 
 using State = ShareStatus::State;
 
+// A pass tells once a second how far it is, but not while it is at a file. In seconds; what is further back was told
+// by another clock.
+constexpr int64_t kLongForOne = 5;
+constexpr int64_t kNotTold = 86400;
+
 constexpr size_t kBarWidth = 24;  // columns between its brackets
 
 constexpr const char* kStates[] = {"current", "pending", "working", "waiting", "paused", "outdated", "blocked"};
@@ -38,6 +43,12 @@ std::string Bar(double part) {
 std::string Pending(const ShareStatus& share) {
   if (!share.queue_age) return {};
   return SizeText(share.queue_bytes) + " of changes, the oldest " + Duration(*share.queue_age) + " old";
+}
+
+std::string Failures(const ShareStatus& share) {
+  if (share.failures == 0) return {};
+  return ", but " + Grouped(share.failures) + (share.failures == 1 ? " file" : " files") +
+         " could not be read; 'fileindexctl status --failed' tells which";
 }
 
 std::string PausedFolders(const ShareStatus& share) {
@@ -75,6 +86,9 @@ std::string Progress(const ShareStatus& share, bool bar) {
   if (const auto rate = share.Rate()) text += ", " + Grouped(static_cast<uint64_t>(llround(*rate))) + " a second";
   if (const auto left = share.SecondsLeft()) text += ", " + Duration(*left) + " left";
   if (progress.failed != 0) text += ", " + Grouped(progress.failed) + " failed";
+  const bool is_stuck = kLongForOne <= share.quiet && share.quiet < kNotTold;
+  if (is_stuck) text += ", at one file for " + Duration(share.quiet);
+  if (!progress.held_back_by.empty()) text += ", slowed down: others need the " + progress.held_back_by;
   return text;
 }
 
@@ -83,10 +97,9 @@ std::string Progress(const ShareStatus& share, bool bar) {
 std::string Describe(const ShareStatus& share) {
   const std::string pending = Pending(share);
   const std::string waits = pending.empty() ? "" : " (" + pending + ")";
-  const uint64_t failed = share.progress.failed;
   switch (share.state) {
     case State::kCurrent:
-      return "up to date" + (failed == 0 ? "" : ", but " + Documents(failed) + " failed") + PausedFolders(share);
+      return "up to date" + Failures(share) + PausedFolders(share);
     case State::kPending:
       return "pending: " + pending;
     case State::kWorking:
@@ -129,6 +142,9 @@ std::string AsJson(const ShareStatus& share) {
   object["path"] = share.progress.path;
   object["queue_bytes"] = Json::UInt64{share.queue_bytes};
   object["queue_seconds"] = OrNull(share.queue_age);
+  object["failures"] = Json::UInt64{share.failures};
+  object["held_back_by"] = share.progress.held_back_by;
+  object["problems"] = Vec2JsonArr(share.problems);
   object["folders"] = Json::Value(Json::arrayValue);
   for (const ShareStatus::Folder& folder : share.folders) {
     Json::Value& data = object["folders"].append(Json::Value(Json::objectValue));
@@ -162,6 +178,7 @@ void Print(const IndexingStatus& status) {
 int Status(const Arguments& arguments) {
   const bool json = arguments.Has("--json");
   if (arguments.Has("--follow")) return FollowStatus(arguments.Has("--until-idle"), json);
+  if (arguments.Has("--failed")) return PrintFailures(json);
   if (arguments.Has("--until-idle")) throw UsageError("--until-idle goes with --follow");
   const IndexingStatus status = LookAtIndexing(true);
   for (const std::string& problem : status.problems) std::cerr << "fileindexctl: " << problem << '\n';

@@ -32,11 +32,13 @@ constexpr int kIoPriorityLowest = (2 << 13) | 7;
 constexpr const char* kOomScore = "500";  // of 1000: as if it held half of the memory besides its own
 
 struct Resource {
+  const char* name;
   const char* file;
   double threshold;  // the share of the time for which something waits for it
 };
-constexpr Resource kResources[] = {
-    {"/proc/pressure/io", 0.25}, {"/proc/pressure/memory", 0.10}, {"/proc/pressure/cpu", 0.25}};
+constexpr Resource kResources[] = {{"disk", "/proc/pressure/io", 0.25},
+                                   {"memory", "/proc/pressure/memory", 0.10},
+                                   {"processor", "/proc/pressure/cpu", 0.25}};
 constexpr size_t kProcessors = 2;
 
 // Others who use that much of all processors have no room to spare.
@@ -99,15 +101,18 @@ bool Pacer::Look(Sample& sample) {
   return true;
 }
 
-// Whether so much waited between two looks, or, where nobody of ours runs, so much of the processors was in use.
-bool Pacer::IsStalled(const Sample& before, const Sample& after, bool resting) {
+// For what so much waited between two looks, or, where nobody of ours runs, so much was in use; null for nothing.
+const char* Pacer::WhatStalls(const Sample& before, const Sample& after, bool resting) {
   const double passed = std::chrono::duration<double, std::micro>(after.at - before.at).count();
   for (size_t i = 0; i < std::size(kResources); ++i) {
     if (i == kProcessors && resting) continue;
-    if (static_cast<double>(after.stalled[i] - before.stalled[i]) > kResources[i].threshold * passed) return true;
+    if (static_cast<double>(after.stalled[i] - before.stalled[i]) > kResources[i].threshold * passed) {
+      return kResources[i].name;
+    }
   }
   const auto busy = static_cast<double>(after.busy - before.busy);
-  return resting && busy > kBusyProcessors * static_cast<double>(after.ticks - before.ticks);
+  const bool is_full = resting && busy > kBusyProcessors * static_cast<double>(after.ticks - before.ticks);
+  return is_full ? kResources[kProcessors].name : nullptr;
 }
 
 void Pacer::Rest(int wake_fd, Clock::time_point end) {
@@ -122,16 +127,18 @@ void Pacer::Pace(int wake_fd) {
   Look(seen);
   look_at_ = now + kBetweenLooks;
   turn_ = 0;
+  held_back_by_ = "";
   if (now - last_.at > kStale) {
     last_ = seen;
     look_at_ = now + kFirstLook;
     return;
   }
-  if (IsStalled(last_, seen, false)) {
+  if (WhatStalls(last_, seen, false) != nullptr) {
     Rest(wake_fd, now + kListening);
     Sample heard = seen;
     Look(heard);
-    if (IsStalled(seen, heard, true)) {
+    if (const char* resource = WhatStalls(seen, heard, true)) {
+      held_back_by_ = resource;
       Rest(wake_fd, now + kRest);
       Look(heard);
       look_at_ = Clock::now() + kTurn;

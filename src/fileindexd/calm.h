@@ -24,6 +24,10 @@ class Pacer {
   // One that is not `wanted`, or finds no pressure to read, never rests.
   explicit Pacer(bool wanted);
 
+  // What others are short of, so that it rested when it looked last: "disk", "memory" or "processor"; empty for
+  // nothing.
+  const char* held_back_by() const { return held_back_by_; }
+
   // Called between any two files; returns early where the descriptor becomes readable.
   void Pace(int wake_fd);
 
@@ -36,11 +40,12 @@ class Pacer {
   };
 
   static bool Look(Sample& sample);
-  static bool IsStalled(const Sample& before, const Sample& after, bool resting);
+  static const char* WhatStalls(const Sample& before, const Sample& after, bool resting);
   static void Rest(int wake_fd, Clock::time_point end);
 
   Sample last_;
   Clock::time_point look_at_ = kNever;
+  const char* held_back_by_ = "";
   int64_t turn_ = 0;  // the processor time of this process up to which it works before it may rest again
 };
 

@@ -5,12 +5,13 @@
 namespace quarrox::fileindexd {
 namespace {
 
-enum Option { kForeground = 1, kEager, kWorker, kHelp };
+enum Option { kForeground = 1, kEager, kWorker, kVersion, kHelp };
 
 constexpr option kOptions[] = {
     {"foreground", no_argument, nullptr, kForeground},
     {"eager", no_argument, nullptr, kEager},
     {"worker", required_argument, nullptr, kWorker},
+    {"version", no_argument, nullptr, kVersion},
     {"help", no_argument, nullptr, kHelp},
     {nullptr, 0, nullptr, 0},
 };
@@ -26,6 +27,9 @@ void Apply(Options& options, int option) {
     case kWorker:
       options.worker = true;
       options.share = optarg;
+      break;
+    case kVersion:
+      options.version = true;
       break;
     case kHelp:
       options.help = true;
@@ -46,6 +50,7 @@ const char* const kUsage =
     "  --foreground     write the log to standard error, too\n"
     "  --eager          work as fast as the machine can; else the others on it come first\n"
     "  --worker SHARE   serve this one share; so the daemon starts its workers\n"
+    "  --version        print the program's version\n"
     "  --help           show this text\n";
 
 Options ParseOptions(int argc, char** argv) {
@@ -53,7 +58,8 @@ Options ParseOptions(int argc, char** argv) {
   opterr = 0;
   optind = 1;
   for (int option; (option = getopt_long(argc, argv, "", kOptions, nullptr)) != -1;) Apply(options, option);
-  if (optind < argc && !options.help) throw UsageError(std::string("'") + argv[optind] + "' is not expected");
+  if (optind < argc && !options.help && !options.version)
+    throw UsageError(std::string("'") + argv[optind] + "' is not expected");
   return options;
 }
 

@@ -8,6 +8,7 @@ namespace quarrox::fileindexd {
 
 struct Options {
   bool help = false;
+  bool version = false;
   bool foreground = false;  // log to standard error, too
   bool eager = false;       // work as fast as the machine can
   bool worker = false;      // serve one share instead of being the daemon

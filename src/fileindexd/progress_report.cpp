@@ -23,6 +23,7 @@ void ProgressReport::Open(const std::string& file) {
 }
 
 void ProgressReport::Save() {
+  if (file_.empty()) return;  // a worker that is paused from its start has opened none yet
   progress_.pid = getpid();
   progress_.updated = time(nullptr);
   progress_.Save(file_);
@@ -43,6 +44,7 @@ void ProgressReport::Become(Progress::State state, const std::string& reason, co
   if (!told_ || progress_.state != state) progress_.since = time(nullptr);
   progress_.state = state;
   progress_.reason = reason;
+  progress_.held_back_by.clear();
   Take(tally);
   Save();
 }
@@ -68,8 +70,9 @@ void ProgressReport::Wait(const std::string& reason, const Tally& tally) {
   Become(Progress::State::kWaiting, reason, tally);
 }
 
-void ProgressReport::Update(const Tally& tally, std::optional<uint64_t> operations) {
+void ProgressReport::Update(const Tally& tally, std::optional<uint64_t> operations, const std::string& held_back_by) {
   Take(tally);
+  progress_.held_back_by = held_back_by;
   if (operations) progress_.left = *operations + tally.left.value_or(1);
   Save();
 }

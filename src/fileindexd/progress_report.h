@@ -26,9 +26,9 @@ class ProgressReport {
   void Wait(const std::string& reason, const Tally& tally);
 
   // While working: whether it is time to tell again, and what there is to tell. `operations` wait behind the one that
-  // is being handled, where that is known.
+  // is being handled, where that is known; `held_back_by` is what Pacer says.
   bool IsDue() const { return Clock::now() >= due_; }
-  void Update(const Tally& tally, std::optional<uint64_t> operations);
+  void Update(const Tally& tally, std::optional<uint64_t> operations, const std::string& held_back_by);
 
  private:
   using Progress = fileindex::IndexProgress;

@@ -104,7 +104,7 @@ void Worker::Arm() {
 // Where a pass is to be left, this leaves it.
 bool Worker::IsToldToLookAgain() {
   pacer_.Pace(signals_.fd());
-  if (progress_.IsDue()) progress_.Update(handler_.tally(), operations_);
+  if (progress_.IsDue()) progress_.Update(handler_.tally(), operations_, pacer_.held_back_by());
   if (!TakeSignals()) return false;
   if (stopping_) throw Interrupted();
   LookAtPause();

@@ -62,6 +62,18 @@ class MonitorTest(unittest.TestCase):
         self.assertEqual(self.lines(name), lines)
         self.queue[name].unlink()
 
+    def test_it_tells_how_each_folder_is_heard_and_is_the_only_one(self):
+        self.configure("docs", DOCS)
+        self.start()
+        told = lambda: json.loads(pathlib.Path("/run/vexonotifyd.status").read_text())
+        self.assertEqual((told()["pid"], told()["folders"][DOCS]["method"]), (self.daemon.pid, self.method))
+        self.assertAlmostEqual(told()["folders"][DOCS]["since"], time.time(), delta=60)
+        self.configure("photos", PHOTOS)
+        self.until(lambda: told()["folders"].get(PHOTOS, {}).get("method") == self.method)
+        self.assertEqual(subprocess.run([DAEMON], stderr=subprocess.DEVNULL, timeout=20).returncode, 1)
+        self.daemon.terminate() or self.daemon.wait()
+        self.assertFalse(os.path.exists("/run/vexonotifyd.status"))
+
     def test_a_folder_that_stays_misses_nothing_while_configurations_come_and_go(self):
         self.configure("docs", DOCS)
         self.start()

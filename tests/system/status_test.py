@@ -81,7 +81,7 @@ class StatusTest(unittest.TestCase):
         while bar % ("#" * 12 + "." * 12, "50 %, 500", 50, 11) not in seen:
             self.assertTrue(select.select([terminal], [], [], 5)[0], seen)
             seen += os.read(terminal, 65536).decode()
-        self.assertIn(bar % ("#" * 6 + "." * 18, "25 %, 250", 25, 31) + "\x1b[?7l\x1b[2A\r", seen)  # with one on fileindexd
+        self.assertIn(bar % ("#" * 6 + "." * 18, "25 %, 250", 25, 31) + "\x1b[?7l\x1b[3A\r", seen)  # with one on each daemon that is missing
         self.tell(state="waiting", reason="No room", since=int(time.time()) - 61)
         self.assertEqual(drawing.wait(10), 1)
         self.assertLessEqual(len(list(iter(log.stdout.readline, b"docs: waiting: No room\n"))), 4)  # one a second

@@ -5,7 +5,9 @@
 #include <gtest/gtest.h>
 
 #include "common/json.h"
+#include "elasticd/document_change.h"
 #include "elasticd/error_code.h"
+#include "elasticd/fields.h"
 #include "elasticd/index.h"
 #include "fileindex/elastic_control.h"
 #include "support/answer_text.h"
@@ -188,6 +190,27 @@ TEST_F(IndexModel, HoldsWhatAModelOfItHolds) {
       if (step % 30 == 29) CompareCommitted();
       if (HasFatalFailure()) return;
     }
+  }
+}
+
+TEST(Fields, WhenADocumentWasMadeIsKeptBesideItsFieldsAndUnknownOfOlderOnes) {
+  const support::TempDir directory;
+  Writer writer(directory.path() + "/db", Writer::kCreate);
+  const Mapping mapping(fileindex::elastic::GetFileIndexMappings());
+  const PathFields path_fields(mapping);
+  const Json::Value fields = Parse(R"({"VEXOMDTitle":"four","VEXOMDSearchFileName":"a","VEXOMDFSSize":7})");
+  const auto show = [&](const std::vector<std::string>& names) {
+    return ShowFields(writer, mapping, path_fields, 1, "/v", "a", names);
+  };
+  for (const int64_t time : {int64_t{0}, int64_t{1}, int64_t{0x7d7d7d01}, int64_t{0xffffffff}}) {
+    KeptFields kept = PartFields(fields, path_fields);
+    kept.indexed = time;
+    SaveFields(writer, 1, kept, Texts::kBoth);
+    const FieldChange change = ChangeFields(writer, 1, path_fields, Parse(R"({"VEXOMDFSSize":8})"), "a", "a");
+    SaveFields(writer, 1, change.kept, change.texts);
+    EXPECT_EQ(show({"VEXOMDFSSize", kIndexedField}).get(kIndexedField, 0).asInt64(), time);
+    EXPECT_EQ(show({kTextBytesField})[kTextBytesField].asUInt64(), 4U);
+    EXPECT_EQ(show({}).isMember(kIndexedField) || show({}).isMember(kTextBytesField), false);
   }
 }
 
