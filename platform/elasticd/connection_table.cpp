@@ -136,9 +136,10 @@ Connection* ConnectionTable::OwnFirst(Stage stage) {
   return connection == nullptr ? nullptr : Own(*connection);
 }
 
-Connection* ConnectionTable::TakeSilent() {
+Connection* ConnectionTable::TakeSilent(bool also_slow) {
   const std::lock_guard lock(mutex_);
-  return OwnFirst(Stage::kIdle);
+  Connection* silent = OwnFirst(Stage::kIdle);
+  return silent == nullptr && also_slow ? OwnFirst(Stage::kReceiving) : silent;
 }
 
 Connection* ConnectionTable::TakeWaiting() {

@@ -44,8 +44,9 @@ class ConnectionTable {
   // The connection that an event is about; null where another thread has it or it is gone.
   Connection* Take(uint64_t token);
 
-  // One that has said nothing for the longest time; null where all are in the middle of something.
-  Connection* TakeSilent();
+  // One that has said nothing for the longest time, or, with `also_slow`, else the one that is at its request for the
+  // longest; null where there is none.
+  Connection* TakeSilent(bool also_slow);
 
   // One whose time is over. Sets the timer for the next.
   Connection* TakeOverdue();

@@ -278,7 +278,7 @@ SearchResult Reader::Search(Query query, const SearchOptions& options) const {
   return Guard([&] {
     Xapian::Enquire enquire(impl_->database);
     const Decider decider(query.TakeChecks());
-    Converter converter(impl_->database);
+    Converter converter(impl_->database, kMostBeginnings, kMostInQuery);
     enquire.set_query(converter.Convert(query));
     if (options.discreet) enquire.set_weighting_scheme(OwnWeight());
     Xapian::MultiValueKeyMaker keys;
@@ -314,9 +314,21 @@ bool Reader::Has(DocumentId id, const std::string& term) const {
   });
 }
 
-std::vector<std::string> Reader::Terms(const std::string& begin) const {
-  return Guard([&] {
-    return std::vector<std::string>(impl_->database.allterms_begin(begin), impl_->database.allterms_end(begin));
+void Reader::ForEachTerm(const std::string& begin, const std::function<bool(const std::string& term)>& take) const {
+  Guard([&] {
+    const Xapian::TermIterator end = impl_->database.allterms_end(begin);
+    for (Xapian::TermIterator term = impl_->database.allterms_begin(begin); term != end; ++term) {
+      if (!take(*term)) return;
+    }
+  });
+}
+
+void Reader::ForEachWith(const std::string& term, const std::function<bool(DocumentId id)>& take) const {
+  Guard([&] {
+    const Xapian::PostingIterator end = impl_->database.postlist_end(term);
+    for (Xapian::PostingIterator posting = impl_->database.postlist_begin(term); posting != end; ++posting) {
+      if (!take(*posting)) return;
+    }
   });
 }
 

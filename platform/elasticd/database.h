@@ -139,8 +139,13 @@ class Reader final : public Store {
   uint64_t CountWith(const std::string& term) const;
   bool Has(DocumentId id, const std::string& term) const;
 
-  // The terms that begin so.
-  std::vector<std::string> Terms(const std::string& begin) const;
+  // Hands out the terms that begin so, and the documents that have a term, until `take` returns false.
+  void ForEachTerm(const std::string& begin, const std::function<bool(const std::string& term)>& take) const;
+  void ForEachWith(const std::string& term, const std::function<bool(DocumentId id)>& take) const;
+
+  // A beginning stands for so many terms at most, and all of a query for so many: each costs memory and a look-up.
+  static constexpr size_t kMostBeginnings = 1000;
+  static constexpr size_t kMostInQuery = 4000;
 
   // A document's number in a field; NaN where it has none.
   double Number(DocumentId id, unsigned int field) const;

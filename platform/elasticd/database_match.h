@@ -22,10 +22,6 @@ inline constexpr Xapian::valueno kFirstNumberSlot = 1;
 // The first bytes of a place, the identifier in big-endian order.
 inline constexpr size_t kDirectoryBytes = sizeof(DirectoryId);
 
-// A beginning stands for so many terms at most, and all of a query for so many: each costs memory and a look-up.
-inline constexpr Xapian::termcount kMostBeginnings = 1000;
-inline constexpr Xapian::termcount kMostInQuery = 4000;
-
 // Lets documents through by their place, and rates them.
 class PlaceSource final : public Xapian::ValuePostingSource {
  public:
@@ -52,10 +48,10 @@ class PlaceSource final : public Xapian::ValuePostingSource {
     SkipOthers();
   }
 
-  // Looks at that document alone.
+  // Goes on to what is wanted: an answer that there is none would make an OR pass over documents of its other parts.
   bool check(Xapian::docid id, double) override {
-    if (!Xapian::ValuePostingSource::check(id, 0)) return false;
-    return at_end() || get_docid() != id || IsWanted();
+    skip_to(id, 0);
+    return true;
   }
 
  private:
@@ -191,7 +187,9 @@ class OwnWeight final : public Xapian::Weight {
 // Makes of a query what the library understands.
 class Converter {
  public:
-  explicit Converter(const Xapian::Database& database) : database_(database) {}
+  // A beginning stands for `most` terms, all of a query for `most_in_all`.
+  Converter(const Xapian::Database& database, size_t most, size_t most_in_all)
+      : database_(database), most_(most), left_(most_in_all) {}
 
   // Nesting is bounded by those who make queries.
   Xapian::Query Convert(const Query& query) {
@@ -256,7 +254,7 @@ class Converter {
   Xapian::Query Beginning(const std::string& term) {
     std::vector<Xapian::Query> terms;
     Xapian::TermIterator at = database_.allterms_begin(term);
-    for (; at != database_.allterms_end(term) && terms.size() < kMostBeginnings && left_ > 0; ++at, --left_) {
+    for (; at != database_.allterms_end(term) && terms.size() < most_ && left_ > 0; ++at, --left_) {
       terms.emplace_back(*at);
     }
     cut_ = cut_ || at != database_.allterms_end(term);
@@ -270,7 +268,8 @@ class Converter {
   }
 
   const Xapian::Database& database_;
-  Xapian::termcount left_ = kMostInQuery;
+  const size_t most_;
+  size_t left_;
   bool cut_ = false;  // a beginning stands for more terms than were taken
 };
 

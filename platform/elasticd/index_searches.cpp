@@ -161,7 +161,7 @@ class Question {
   bool MayShow(const Hit& hit) { return !readable_ || readable_->IsReadable(hit.id); }
 
   const std::vector<LineWord>& words() const { return parser_.line_words(); }
-  bool cut() const { return parser_.cut(); }
+  bool cut() const { return parser_.cut() || (readable_ && readable_->cut()); }
 
   // The line with words that documents have in place of those that none has, where that finds more than `found`; else
   // empty.
@@ -262,7 +262,12 @@ void Index::SearchCommitted(const SearchRequest& request, Answer& answer) {
   if (request.as && !result.exact) answer.Append(",\"at_least\":true");
   if (result.cut || question.cut()) answer.Append(",\"cut\":true");
   if (!request.suggest || result.total >= kLittle) return;
-  const auto suggestion = Retry(reader, places, [&] { return question.Suggest(result.total); });
+  std::string suggestion;
+  try {
+    suggestion = Retry(reader, places, [&] { return question.Suggest(result.total); });
+  } catch (const Error& error) {
+    if (!request.as || error.code != kBadQuery) throw;  // what takes too long to be found for a user is not suggested
+  }
   if (!suggestion.empty()) answer.Append(",\"suggestion\":" + toString(Json::Value(suggestion)));
 }
 

@@ -119,6 +119,10 @@ std::shared_ptr<size_t> LineBudget::MostLooks() {
   return std::make_shared<size_t>(kMostLooks);
 }
 
+bool LineBudget::TakePath() {
+  return ++paths <= kMostPaths;
+}
+
 LineQuery::LineQuery(const Mapping& mapping, const Store& store, const Places& places, LineSettings settings,
                      LineBudget& budget)
     : mapping_(mapping),
@@ -330,7 +334,7 @@ Query LineQuery::ByDate(const LineNode& node) const {
 }
 
 Query LineQuery::ByPath(const LineNode& node) {
-  if (++budget_.paths > kMostPaths) FailAt(line_, node.begin, "over " + std::to_string(kMostPaths) + " paths");
+  if (!budget_.TakePath()) FailAt(line_, node.begin, "over " + std::to_string(kMostPaths) + " paths");
   const bool from_root = node.text.starts_with('/');
   const std::vector<NamePattern> patterns = ComponentPatterns(node);
   if (patterns.empty()) return from_root ? Query{Query::kEverything} : Query{Query::kNothing};

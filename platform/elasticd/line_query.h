@@ -39,6 +39,9 @@ struct LineBudget {
   size_t paths = 0;                             // conditions on paths
   std::shared_ptr<size_t> looks = MostLooks();  // so many documents may yet be looked at
   static std::shared_ptr<size_t> MostLooks();
+
+  // Counts a condition on paths; false where there are too many.
+  bool TakePath();
 };
 
 // Paths are looked up while a query is made, so it is good for what the places then hold. What it returns looks into

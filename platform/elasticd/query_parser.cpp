@@ -142,7 +142,7 @@ Query QueryParser::WordsInAll(std::string_view text) const {
   return Query::Of(Query::kOr, std::move(parts));
 }
 
-Query QueryParser::Match(const std::string& name, const Json::Value& value) const {
+Query QueryParser::Match(const std::string& name, const Json::Value& value) {
   if (name == "_all") return WordsInAll(Text(name, value));
   const Field field = mapping_.Get(name);
   const Kind kind = path_fields_.KindOf(name);
@@ -157,14 +157,20 @@ Query QueryParser::Match(const std::string& name, const Json::Value& value) cons
   return Simplify(Query::kAnd, std::move(parts));
 }
 
+// Each reads the directories below it.
+void QueryParser::TakePath() {
+  if (!budget_.TakePath()) Fail("The query has too many conditions on paths");
+}
+
 // The documents in a directory and below it.
-Query QueryParser::Below(std::string_view directory) const {
+Query QueryParser::Below(std::string_view directory) {
+  TakePath();
   if (directory == "/") directory = {};
   const DirectoryId top = places_.FindDirectory(directory);
   return top == 0 ? Query{Query::kNothing} : InDirectories(places_.Tree(top), {});
 }
 
-Query QueryParser::Term(const std::string& name, const Json::Value& value) const {
+Query QueryParser::Term(const std::string& name, const Json::Value& value) {
   const Field field = mapping_.Get(name);
   if (field.IsNumber()) {
     const double number = Number(name, value);
@@ -187,7 +193,8 @@ Query QueryParser::Term(const std::string& name, const Json::Value& value) const
 }
 
 // What stands in the directory itself, and everything below those of its directories that fit.
-Query QueryParser::PathPrefix(const std::string& prefix) const {
+Query QueryParser::PathPrefix(const std::string& prefix) {
+  TakePath();
   const size_t slash = prefix.rfind('/');
   if (slash == std::string::npos) return Query{prefix.empty() ? Query::kEverything : Query::kNothing};
   const DirectoryId directory = places_.FindDirectory(std::string_view(prefix).substr(0, slash));
@@ -198,7 +205,7 @@ Query QueryParser::PathPrefix(const std::string& prefix) const {
                    {InDirectories({directory}, begin), InDirectories(places_.TreesIn(directory, begin), {})});
 }
 
-Query QueryParser::Prefix(const std::string& name, const Json::Value& value) const {
+Query QueryParser::Prefix(const std::string& name, const Json::Value& value) {
   const std::string text = Text(name, value);
   const Field field = mapping_.Get(name);
   const Kind kind = path_fields_.KindOf(name);

@@ -43,15 +43,16 @@ class QueryParser {
 
  private:
   Query ParseAt(const Json::Value& qsl, int depth);
-  Query Match(const std::string& name, const Json::Value& value) const;
-  Query Term(const std::string& name, const Json::Value& value) const;
-  Query Prefix(const std::string& name, const Json::Value& value) const;
+  Query Match(const std::string& name, const Json::Value& value);
+  Query Term(const std::string& name, const Json::Value& value);
+  Query Prefix(const std::string& name, const Json::Value& value);
   Query Range(const std::string& name, const Json::Value& bounds) const;
   Query Bool(const Json::Value& clauses, int depth);
   Query Line(const Json::Value& value);
   Query WordsInAll(std::string_view text) const;
-  Query Below(std::string_view directory) const;
-  Query PathPrefix(const std::string& prefix) const;
+  void TakePath();
+  Query Below(std::string_view directory);
+  Query PathPrefix(const std::string& prefix);
 
   const Mapping& mapping_;
   const PathFields& path_fields_;

@@ -1,6 +1,7 @@
 #include "readable.h"
 
 #include <charconv>
+#include <cstdio>
 #include <string_view>
 #include <utility>
 #include <vector>
@@ -12,6 +13,7 @@ namespace {
 
 constexpr char kPrivilegeField[] = "VEXOMDPrivilege";  // the mode in octal digits
 constexpr char kOwnerField[] = "VEXOMDOwnerUserID";
+constexpr char kGroupField[] = "VEXOMDOwnerGroupID";
 constexpr char kSizeField[] = "VEXOMDFSSize";
 constexpr char kChangedField[] = "VEXOMDFSContentChangeDate";
 constexpr char kIsDirectoryField[] = "VEXOMDIsDir";
@@ -37,6 +39,7 @@ ReadableOnly::ReadableOnly(const Reader& reader, const Places& places, const Map
       places_(places),
       privilege_(Needed(mapping, kPrivilegeField)),
       owner_(Needed(mapping, kOwnerField)),
+      group_(Needed(mapping, kGroupField)),
       size_(Needed(mapping, kSizeField)),
       changed_(Needed(mapping, kChangedField)),
       is_directory_(Needed(mapping, kIsDirectoryField)),
@@ -45,8 +48,8 @@ ReadableOnly::ReadableOnly(const Reader& reader, const Places& places, const Map
       end_(std::chrono::steady_clock::now() + kLongest) {}
 
 // What other checks look at counts, and too many end a search early, which is told: so they look at what is readable
-// only, wherever they stand.
-void ReadableOnly::LookBeforeChecks(Query& query) {
+// only, wherever they stand. So do beginnings.
+void ReadableOnly::RestrictParts(Query& query) {
   std::vector<Query*> left = {&query};
   while (!left.empty()) {
     Query& part = *left.back();
@@ -54,12 +57,32 @@ void ReadableOnly::LookBeforeChecks(Query& query) {
     if (part.kind == Query::kCheck) {
       part.check = [this, then = std::move(part.check)](DocumentId id) { return WasReadable(id) && then(id); };
     }
+    if (part.kind == Query::kBeginning) Expand(part);
     for (Query& inner : part.parts) left.push_back(&inner);
   }
 }
 
+// The first of the terms that readable documents have.
+void ReadableOnly::Expand(Query& beginning) {
+  Query terms{Query::kSame};
+  reader_.ForEachTerm(beginning.term, [&](const std::string& term) {
+    bool is_known = false;
+    reader_.ForEachWith(term, [&](DocumentId id) { return !(is_known = WasReadable(id)); });
+    if (!is_known) return true;
+    cut_ = cut_ || terms.parts.size() == Reader::kMostBeginnings || left_ == 0;
+    if (terms.parts.size() == Reader::kMostBeginnings || left_ == 0) return false;
+    terms.parts.push_back(Query::Term(term));
+    --left_;
+    return true;
+  });
+  beginning = std::move(terms);
+}
+
 Query ReadableOnly::Restrict(Query query) {
-  LookBeforeChecks(query);
+  looked_.clear();
+  left_ = Reader::kMostInQuery;
+  cut_ = false;
+  RestrictParts(query);
   Query look{Query::kCheck};
   look.check = [this](DocumentId id) { return WasReadable(id); };
   std::vector<Query> parts;
@@ -75,7 +98,7 @@ Query ReadableOnly::MayBeRead() const {
   const std::string prefix = PrefixOf(privilege_);
   std::vector<Query> open;
   std::vector<Query> of_owner;
-  for (const std::string& term : reader_.Terms(prefix)) {
+  reader_.ForEachTerm(prefix, [&](const std::string& term) {
     const std::string_view digits = std::string_view(term).substr(prefix.size());
     unsigned int mode = 0;
     std::from_chars(digits.data(), digits.data() + digits.size(), mode, 8);
@@ -84,16 +107,17 @@ Query ReadableOnly::MayBeRead() const {
     } else if ((mode & S_IRUSR) != 0) {
       of_owner.push_back(Query::Term(term));
     }
-  }
+    return true;
+  });
   open.push_back(Query::Of(Query::kAnd, {Query::Term(ExactTerm(owner_, std::to_string(user_))),
                                          Query::Of(Query::kOr, std::move(of_owner))}));
   return Query::Of(Query::kOr, std::move(open));
 }
 
 bool ReadableOnly::WasReadable(DocumentId id) {
-  if (id != last_) last_was_readable_ = IsReadable(id);
-  last_ = id;
-  return last_was_readable_;
+  const auto known = looked_.find(id);
+  if (known != looked_.end()) return known->second;
+  return looked_[id] = IsReadable(id);
 }
 
 bool ReadableOnly::IsReadable(DocumentId id) {
@@ -127,6 +151,10 @@ bool ReadableOnly::IsKnownAs(DocumentId id, const struct stat& info) const {
   const bool is_directory = reader_.Number(id, is_directory_.number) == 1;
   if (is_directory != S_ISDIR(info.st_mode)) return false;
   if (is_directory) return true;
+  char mode[8];
+  snprintf(mode, sizeof(mode), "%03o", info.st_mode & 07777U);
+  if (!reader_.Has(id, ExactTerm(privilege_, mode))) return false;
+  if (!reader_.Has(id, ExactTerm(group_, std::to_string(info.st_gid)))) return false;
   return reader_.Number(id, size_.number) == static_cast<double>(info.st_size) &&
          reader_.Number(id, changed_.number) == static_cast<double>(info.st_mtim.tv_sec);
 }

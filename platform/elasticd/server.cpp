@@ -266,7 +266,7 @@ void Server::Impl::Welcome(Worker& worker, UniqueFd& client) {
   Connection* connection = table.Admit(client, user);
   if (connection == nullptr) {
     const char* const full = "Too many clients are connected; ask again later";
-    Connection* silent = table.TakeSilent();
+    Connection* silent = table.TakeSilent(settings.for_everybody);
     worker.SendRefusal(silent != nullptr ? silent->fd.get() : client.get(), full);
     if (silent == nullptr) return;
     table.Release(*silent);

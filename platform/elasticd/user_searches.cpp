@@ -1,37 +1,42 @@
 #include "user_searches.h"
 
+#include <chrono>
+
 #include "common/error.h"
 #include "error_code.h"
 
 namespace quarrox::elasticd {
 namespace {
 
-// Searches in an index go one by one, so that more of one user would only hold up the others.
-constexpr int kMostOfOne = 2;
+// Searches in an index go one by one, so that more of one user at a time would only hold up the others.
 constexpr int kMostOfAll = 32;
+
+// How long a user's search waits for another one of the same user.
+constexpr std::chrono::seconds kPatience(15);
 
 // What is not read waits on the disk: a page of hits is far less, and the longest list of them some megabytes.
 constexpr uint64_t kLongestAnswer = uint64_t{8} << 20;
 
 }  // namespace
 
-// Counts a search while it runs. Throws Error 1401 where there are too many.
+// Counts a search while it runs. Waits for another one of the same user; throws Error 1401 where that takes too long,
+// or there are too many.
 class UserSearches::Turn {
  public:
   Turn(UserSearches& searches, uid_t user) : searches_(searches), user_(user) {
-    const std::lock_guard lock(searches_.mutex_);
-    const auto own = searches_.running_.find(user_);
-    if (own != searches_.running_.end() && own->second >= kMostOfOne) {
-      throw Error(kTooManyRequests, "So many searches of this user run already; ask again when one has ended");
+    std::unique_lock lock(searches_.mutex_);
+    const auto is_free = [&] { return !searches_.running_.contains(user_); };
+    if (!searches_.ended_.wait_for(lock, kPatience, is_free)) {
+      throw Error(kTooManyRequests, "Another search of this user runs; ask again when it has ended");
     }
-    if (searches_.all_ >= kMostOfAll) throw Error(kTooManyRequests, "Too many searches run; ask again later");
-    ++searches_.running_[user_];
-    ++searches_.all_;
+    if (searches_.running_.size() >= kMostOfAll)
+      throw Error(kTooManyRequests, "Too many searches run; ask again later");
+    searches_.running_.insert(user_);
   }
   ~Turn() {
     const std::lock_guard lock(searches_.mutex_);
-    --searches_.all_;
-    if (--searches_.running_[user_] == 0) searches_.running_.erase(user_);
+    searches_.running_.erase(user_);
+    searches_.ended_.notify_all();
   }
   Turn(const Turn&) = delete;
   Turn& operator=(const Turn&) = delete;

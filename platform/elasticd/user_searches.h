@@ -1,8 +1,9 @@
 // Searches of users who may do nothing else with the engine.
 #pragma once
 
-#include <map>
+#include <condition_variable>
 #include <mutex>
+#include <set>
 #include <string>
 
 #include "answer.h"
@@ -25,8 +26,8 @@ class UserSearches {
 
   Engine& engine_;
   std::mutex mutex_;
-  std::map<uid_t, int> running_;  // searches of each user
-  int all_ = 0;
+  std::condition_variable ended_;
+  std::set<uid_t> running_;  // whose searches run
 };
 
 }  // namespace quarrox::elasticd

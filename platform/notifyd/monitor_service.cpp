@@ -30,6 +30,7 @@ int Earlier(int a, int b) {
 MonitorService::MonitorService(const Options& options, const std::string& directory, const std::string& status_file)
     : files_(std::make_unique<MonitorFiles>(directory)), watches_(options.method, options.limited_queue) {
   if (!status_file.empty()) status_ = std::make_unique<WatchStatus>(status_file);
+  if (status_ != nullptr) status_->Tell({});  // the first look at large folders takes long
   Follow();
   Flush();
 }

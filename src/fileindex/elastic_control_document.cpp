@@ -177,7 +177,8 @@ bool IndexAttrOfSame(const std::string& share, const std::string& path) {
   if (hits.empty()) return false;
   const Json::Value& known = hits[0];
   Json::Value document = BuildDocument(path, false);
-  const bool is_directory = known[kIsDirectory] == true && document[kIsDirectory] == true;
+  if (known[kIsDirectory] != document[kIsDirectory]) return false;
+  const bool is_directory = document[kIsDirectory] == true;
   const auto is_same = [&](const char* field) {
     const Json::Value& now = document[field];
     return now.isNumeric() ? known[field].isNumeric() && known[field].asDouble() == now.asDouble()

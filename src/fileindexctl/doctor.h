@@ -51,6 +51,9 @@ class Findings {
 // Starts a daemon again, or for the first time where `pid` is 0, by what the machine has for that.
 std::string RestartCommand(const std::string& daemon, pid_t pid);
 
+// Allows more inotify watches than now.
+std::string RaiseWatchesCommand();
+
 // One configuration of the notification daemon that was made for a share's queue.
 struct MonitorConfig {
   std::string file = {};

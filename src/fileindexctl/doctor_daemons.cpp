@@ -135,10 +135,17 @@ bool IsService(const std::string& daemon) {
 
 }  // namespace
 
+// One that was started by hand is not systemd's to end, and keeps another one out.
 std::string RestartCommand(const std::string& daemon, pid_t pid) {
-  if (IsService(daemon)) return ShellLine({"systemctl", "restart", daemon});
-  std::string start = ShellLine({"setsid", "-f", daemon});
   const std::string number = std::to_string(pid);
+  const bool is_service = IsService(daemon);
+  std::string cgroup;
+  if (is_service && pid != 0) getline(std::ifstream("/proc/" + number + "/cgroup"), cgroup, '\0');
+  if (is_service && (pid == 0 || cgroup.find('/' + daemon + ".service") != std::string::npos)) {
+    return ShellLine({"systemctl", "restart", daemon});
+  }
+  const std::string start =
+      is_service ? ShellLine({"systemctl", "restart", daemon}) : ShellLine({"setsid", "-f", daemon});
   if (pid == 0) return start;
   return "kill " + number + "; while kill -0 " + number + " 2>/dev/null; do sleep 0.1; done; " + start;
 }

@@ -94,6 +94,10 @@ void ReportWithoutFanotify(const std::string& share, const std::string& why, Fin
 
 }  // namespace
 
+std::string RaiseWatchesCommand() {
+  return SetLimit("max_user_watches", std::max(2 * ReadLimit("max_user_watches"), kManyWatches));
+}
+
 void CheckInotify(Machine& machine, Findings& findings) {
   const uint64_t limit = ReadLimit("max_user_instances");
   const uint64_t needed = machine.served().size() + kSpareInstances;
@@ -104,8 +108,7 @@ void CheckInotify(Machine& machine, Findings& findings) {
                        " may be needed" + (fd ? "" : std::string("; none is left now: ") + reason),
                    SetLimit("max_user_instances", std::max(2 * limit, 2 * needed)));
   } else if (reason != nullptr) {
-    findings.Wrong(std::string("no inotify watch is left: ") + reason,
-                   SetLimit("max_user_watches", std::max(2 * ReadLimit("max_user_watches"), kManyWatches)));
+    findings.Wrong(std::string("no inotify watch is left: ") + reason, RaiseWatchesCommand());
   }
   findings.WellIfNothing(std::to_string(limit) + " instances and " + std::to_string(ReadLimit("max_user_watches")) +
                          " watches are allowed");

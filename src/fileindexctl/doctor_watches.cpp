@@ -44,7 +44,7 @@ void ReportUnheard(const std::string& folder, const std::string& why, pid_t daem
   if (!IsDirExist(folder, true)) return;  // CheckFolders says so
   const std::string text = "nothing hears what changes in " + folder + (why.empty() ? "" : ": " + why);
   if (why.find("max_user_watches") == std::string::npos) return findings.Wrong(text, RestartCommand(kNotifyd, daemon));
-  findings.Wrong(text, ShellLine({"sysctl", "-w", "fs.inotify.max_user_watches=1048576"}));
+  findings.Wrong(text, RaiseWatchesCommand());
 }
 
 // What the daemon of this process tells; null where it tells nothing.
@@ -61,9 +61,13 @@ std::map<std::string, Heard> CountHeard(const Json::Value& folders, pid_t daemon
   for (const auto& [queue, config] : machine.monitors()) {
     for (const std::string& folder : config.directories) {
       const Json::Value& told = folders[folder];
-      const std::string method = told.isObject() ? TextOf(told["method"]) : "";
+      if (!told.isObject()) {
+        findings.Well(folder + " is being looked at for the first time; what happens in it is heard from then on");
+        continue;
+      }
+      const std::string method = TextOf(told["method"]);
       if (method.empty()) {
-        ReportUnheard(folder, told.isObject() ? TextOf(told["reason"]) : "", daemon, findings);
+        ReportUnheard(folder, TextOf(told["reason"]), daemon, findings);
         continue;
       }
       Heard& heard = methods[method];

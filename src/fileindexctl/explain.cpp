@@ -1,6 +1,7 @@
 #include "explain.h"
 
 #include <algorithm>
+#include <filesystem>
 
 #include "command.h"
 #include "common/comm.h"
@@ -42,6 +43,9 @@ bool HasShare(const std::string& full_path, std::string& share) {
 std::string AsFullPath(const std::string& typed) {
   std::string share;
   std::string path = typed.front() == '/' ? typed : RealPath(".") + "/" + typed;
+  // Behind a link ".." is elsewhere than it looks.
+  if ((path + '/').find("/../") == std::string::npos) path = std::filesystem::path(path).lexically_normal().string();
+  while (path.size() > 1 && path.ends_with('/')) path.pop_back();
   if (IsFileExist(path) || HasShare(path, share)) return path;
   try {
     return fileindex::GetFullPath(path);
@@ -142,7 +146,8 @@ std::string RemedyFor(const Explanation& result) {
   if (!fate.paused.empty()) return ResumeCommand(*result.folder);
   if (fate.is_pending.value_or(false) && IsAllPaused()) return "fileindexctl resume";
   if (!fate.is_pending || !fate.is_indexed) return "fileindexctl doctor";
-  if (fate.failure) return "put right what it says, then: " + ShellLine({"touch", result.path});
+  if (fate.failure)
+    return "put right what it says, then: " + ShellLine({"touch", "-c", "-r", result.path, result.path});
   if (!*fate.is_pending && !*fate.is_indexed) {
     return ShellLine({"fileindexctl", "folder", "reindex", result.folder->GetPath()});
   }

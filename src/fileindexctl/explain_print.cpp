@@ -99,7 +99,7 @@ std::string DescribeFolder(const Explanation& explanation) {
   if (folder == nullptr) return explanation.is_folder_known ? "none, so it is not indexed" : "cannot be told";
   const std::string types = TypesOf(*folder);
   return folder->GetPath() + " (" + folder->GetName() + "), " +
-         (types == "none" ? "names only" : "contents of these types: " + types);
+         (types == "none" ? "names, and the contents of files of no known type" : "contents of these types: " + types);
 }
 
 }  // namespace

@@ -35,6 +35,22 @@ bool IsPlain(char c) {
          std::string("/._-+=:,@%").find(c) != std::string::npos;
 }
 
+// A word with what a terminal obeys, as bash, zsh and ksh read it: on its way to a person's eyes nothing of it is lost.
+std::string WithEscapes(const std::string& word) {
+  std::string quoted = "$'";
+  for (const char c : word) {
+    char code[8];
+    const auto byte = static_cast<unsigned char>(c);
+    if (byte >= 0x20 && byte < 0x7f && c != '\'' && c != '\\') {
+      quoted += c;
+    } else {
+      snprintf(code, sizeof(code), "\\%03o", byte);
+      quoted += code;
+    }
+  }
+  return quoted + '\'';
+}
+
 }  // namespace
 
 std::string ShellLine(const std::vector<std::string>& words) {
@@ -43,6 +59,10 @@ std::string ShellLine(const std::vector<std::string>& words) {
     if (!line.empty()) line += ' ';
     if (!word.empty() && std::all_of(word.begin(), word.end(), IsPlain)) {
       line += word;
+      continue;
+    }
+    if (Visible(word) != word) {
+      line += WithEscapes(word);
       continue;
     }
     line += '\'';

@@ -14,6 +14,8 @@
 #include <cstring>
 #include <iterator>
 #include <memory>
+#include <utility>
+#include <vector>
 
 #include <acl/libacl.h>
 
@@ -66,6 +68,7 @@ std::string WhoHas(int fd, acl_perm_t right, const struct stat& info) {
   const bool is_off = is_masked && (info.st_mode & 0070) == 0;
   std::string granted;
   std::string refused;
+  std::string refused_users;  // who may be members of a group that is let in, and are not let in with it
   bool others = false;
   acl_entry_t entry;
   for (int which = ACL_FIRST_ENTRY; acl_get_entry(list, which, &entry) == 1; which = ACL_NEXT_ENTRY) {
@@ -78,10 +81,15 @@ std::string WhoHas(int fd, acl_perm_t right, const struct stat& info) {
     const bool is_named = tag == ACL_USER || tag == ACL_GROUP;
     if (is_off && is_named) continue;
     if (is_masked && (is_named || tag == ACL_GROUP_OBJ)) has = false;
-    if (const std::string name = NameOf(entry, tag, info); !name.empty()) Append(has ? granted : refused, name);
+    const std::string name = NameOf(entry, tag, info);
+    if (name.empty()) continue;
+    Append(has ? granted : refused, name);
+    if (!has && (tag == ACL_USER_OBJ || tag == ACL_USER)) Append(refused_users, name);
   }
   if (others) return kEverybody + (refused.empty() ? "" : " but " + refused);
-  return granted.empty() ? kNobody : granted;
+  if (granted.empty()) return kNobody;
+  const bool is_of_groups = granted.find("members of ") != std::string::npos;
+  return is_of_groups && !refused_users.empty() ? granted + ", but not " + refused_users : granted;
 }
 
 struct Refused {
@@ -137,12 +145,41 @@ Refused AskKernel(const passwd& user, const std::string& path) {
   return refused;
 }
 
-// What gives the user the right, and nobody else if the tool for that is there.
+// The letters of the rights that a user's own entry in an access control list gives already, and of one more.
+std::string WithOwnRights(uid_t user, const std::string& path, char right) {
+  std::string letters(1, right);
+  const std::unique_ptr<void, int (*)(void*)> acl(acl_get_file(path.c_str(), ACL_TYPE_ACCESS), acl_free);
+  acl_entry_t entry;
+  for (int which = ACL_FIRST_ENTRY; acl && acl_get_entry(static_cast<acl_t>(acl.get()), which, &entry) == 1;
+       which = ACL_NEXT_ENTRY) {
+    acl_tag_t tag = ACL_UNDEFINED_TAG;
+    acl_permset_t rights = nullptr;
+    acl_get_tag_type(entry, &tag);
+    acl_get_permset(entry, &rights);
+    if (tag != ACL_USER) continue;
+    const std::unique_ptr<void, int (*)(void*)> id(acl_get_qualifier(entry), acl_free);
+    if (id == nullptr || *static_cast<const uid_t*>(id.get()) != user) continue;
+    for (const auto& [letter, bit] : {std::pair{'r', ACL_READ}, {'w', ACL_WRITE}, {'x', ACL_EXECUTE}}) {
+      if (letter != right && acl_get_perm(rights, static_cast<acl_perm_t>(bit)) == 1) letters += letter;
+    }
+  }
+  return letters;
+}
+
+// What gives the user the right, and nobody else if the tool for that is there. The mask of a list stays as it is: a
+// new one would let through what it holds back of others.
 std::string RemedyFor(const passwd& user, const std::string& path, const struct stat& info, char right) {
   const std::string as_well = std::string("+") + right;
   if (info.st_uid == user.pw_uid) return ShellLine({"chmod", "u" + as_well, path});
+  const bool has_list = acl_extended_file(path.c_str()) == 1;
+  const mode_t of_mask = right == 'x' ? S_IXGRP : S_IRGRP;
+  if (has_list && (info.st_mode & of_mask) == 0) {
+    return "its mask holds its access list back; say who is to have what: " + ShellLine({"getfacl", path});
+  }
   if (IsFileExist("/usr/bin/setfacl")) {
-    return ShellLine({"setfacl", "-m", "u:" + std::string(user.pw_name) + ':' + right, path});
+    const std::string entry = "u:" + std::string(user.pw_name) + ':' + WithOwnRights(user.pw_uid, path, right);
+    return ShellLine(has_list ? std::vector<std::string>{"setfacl", "-n", "-m", entry, path}
+                              : std::vector<std::string>{"setfacl", "-m", entry, path});
   }
   gid_t groups[1024];
   int count = std::size(groups);

@@ -206,13 +206,17 @@ class PermissionTest(unittest.TestCase):
             for kind in "csv", "md":
                 self.make(DOCS / ("n%d.%s" % (number, kind)), "common", 0, 0, 0o644)
         self.make(DOCS / "own.txt", "blackbiryz zebra merger", 0, 0, 0o644)
-        self.make(DOCS / "hidden.csv", "blackbird merger zebra", 0, 0, 0o600)
+        self.make(DOCS / "hidden.csv", "blackbird merger zebra robin", 0, 0, 0o600)
+        self.make(DOCS / "words.txt", " ".join("robin%04d wren%04d" % (n, n) for n in range(1000)), 0, 0, 0o644)
         self.serve()
         self.assertEqual(machine.ctl("suggest", "rebuild")[0], 0)
         self.assertEqual(line("blackbirx", suggest=True)["suggestion"], "blackbird")
         self.assertEqual(line("blackbirx", "u0", suggest=True)["suggestion"], "blackbiryz")
         told = [{key: line(text, "u0", size=1).get(key) for key in ("total", "exact", "at_least", "cut")} for text in ("ext:csv", "ext:md")]
         self.assertEqual(told[0], told[1])
+        self.assertTrue(line("robin*")["cut"])
+        self.assertEqual([(answer["total"], "cut" in answer) for answer in (line("robin*", "u0"), line("wren*", "u0"))], [(1, False)] * 2)
+        self.assertEqual(line("robin0999 robin*", "u0")["total"], 1)
         phrase = '"merger zebra" OR ' * 60 + "nothing"
         self.assertEqual(line(phrase, "u0")["total"], 0)
         own = "/run/vexosearch.sock"
@@ -226,8 +230,8 @@ class PermissionTest(unittest.TestCase):
             return answered
 
         self.assertEqual(as_user("u0", crowd), 24)
-        many = {"bool": {"should": [{"query_string": "path:*n*"}] * 20}}
-        self.assertEqual(as_user("u0", lambda: ask(own, qsl=many))["error"]["code"], 613)
+        for many in {"query_string": "path:*n*"}, {"term": {"VEXOMDSearchAncestor": "/"}}, {"prefix": {"VEXOMDPath": "/"}}:
+            self.assertEqual(as_user("u0", lambda: ask(own, qsl={"bool": {"should": [many] * 20}}))["error"]["code"], 613)
         self.assertEqual(as_user("u0", lambda: ask(own, qsl={"query_string": "common"}, sort=["VEXOMDFSSize"] * 20))["error"]["code"], 613)
 
     def test_what_was_put_in_the_place_of_another_file_shows_nothing_of_it(self):
@@ -238,6 +242,10 @@ class PermissionTest(unittest.TestCase):
             self.make(path, "common secret", USERS["u1"], GROUPS["g2"], 0o640)
         os.chown(DOCS / "all/bobs", USERS["u1"], USERS["u1"])
         self.make(DOCS / "all/owned.txt", "common hoard", USERS["u1"], GROUPS["g2"], 0o600)
+        os.symlink("x" * len("common hoard"), DOCS / "all/link")
+        for path in DOCS / "all/owned.txt", DOCS / "all/link":
+            os.utime(path, (10**9, 10**9), follow_symlinks=False)
+        os.chown(DOCS / "all/link", USERS["u1"], GROUPS["g2"], follow_symlinks=False)
         (DOCS / "all/public").mkdir()
         os.chown(DOCS / "all/public", USERS["u1"], GROUPS["g2"])
         self.make(DOCS / "all/other.txt", "common second", USERS["u1"], GROUPS["g2"], 0o644)
@@ -262,7 +270,9 @@ class PermissionTest(unittest.TestCase):
         self.assertEqual(seen("secret"), [])
         as_user("u0", lambda: (os.rename(DOCS / "all/owned.txt", DOCS / "all/kept.txt"), os.rename(DOCS / "all/public", DOCS / "all/owned.txt")))
         self.assertEqual(seen("hoard"), [])
-        as_user("u0", lambda: (os.rename(DOCS / "all/owned.txt", DOCS / "all/public"), os.rename(DOCS / "all/kept.txt", DOCS / "all/owned.txt")))
+        as_user("u0", lambda: (os.rename(DOCS / "all/owned.txt", DOCS / "all/public"), os.rename(DOCS / "all/link", DOCS / "all/owned.txt")))
+        self.assertEqual(seen("hoard"), [])
+        as_user("u0", lambda: (os.rename(DOCS / "all/owned.txt", DOCS / "all/link"), os.rename(DOCS / "all/kept.txt", DOCS / "all/owned.txt")))
         os.chmod(DOCS / "all/other.txt", 0o600)
         self.assertEqual(seen("second"), [])
         self.assertEqual(machine.ctl("resume")[0], 0)

@@ -206,6 +206,28 @@ TEST_F(SearchTest, NoLineTakesLongOrMuch) {
   EXPECT_FALSE(Ask("w11*").isMember("cut"));
 }
 
+TEST_F(SearchTest, AConditionThatAllFitTakesNothingAway) {
+  std::mt19937 random(3);
+  const auto letters = [&](size_t count) {
+    std::string text;
+    while (count-- > 0) text += static_cast<char>('a' + random() % 4);
+    return text;
+  };
+  const char* const kinds[] = {".txt", ".csv", ".md"};
+  for (int i = 0; i < 200; ++i)
+    Write("d" + letters(1) + "/" + letters(4) + std::to_string(i) + kinds[i % 3], letters(1));
+  index_.Commit();
+  for (int round = 0; round < 200; ++round) {
+    std::string line;
+    for (size_t left = 3 + random() % 2; left > 0; --left) {
+      const std::string conditions[] = {"name:" + letters(2), "path:d" + letters(1),
+                                        std::string("ext:") + (kinds[random() % 3] + 1), letters(1)};
+      line += (line.empty() ? "" : " OR ") + conditions[random() % 4];
+    }
+    ASSERT_EQ(Found("(" + line + ") ext:txt,csv,md"), Found(line)) << line;
+  }
+}
+
 TEST_F(SearchTest, AnOddLineIsAnsweredOrRefusedAtAColumnThatItHas) {
   const std::string pieces[] = {"\"",
                                 "(",

@@ -19,12 +19,13 @@ constexpr int kRetrySteps = 10;
 constexpr mode_t kLockMode = 0644;
 
 // What exists is opened without O_CREAT: in a directory like /tmp the kernel refuses that flag, even to root, on a file
-// of somebody else (fs.protected_regular). A new file gets its mode whatever the umask is, so that others can open it.
+// of somebody else (fs.protected_regular). A pipe that somebody has put there does not hold the caller up. A new file
+// gets its mode whatever the umask is, so that others can open it.
 int OpenLock(const std::string& path) {
   const int error = errno;
-  int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC);
+  int fd = open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC);
   if (fd >= 0 || errno != ENOENT) return fd;
-  fd = open(path.c_str(), O_RDONLY | O_CREAT | O_CLOEXEC, kLockMode);
+  fd = open(path.c_str(), O_RDONLY | O_CREAT | O_NONBLOCK | O_CLOEXEC, kLockMode);
   if (fd < 0) return fd;
   if (fchmod(fd, kLockMode) != 0) {
     // Somebody else has made it meanwhile.
