@@ -134,7 +134,7 @@ class Queries:
 def hits(command):
     """How many the command says it found."""
     out = subprocess.run([*map(str, command)], capture_output=True, text=True, env={**os.environ, "HOME": str(ROOT)}).stdout
-    found = re.search(r"^(?:\d+ to \d+ of (?:about )?)?(\d+)(?: results.*)?$", out, re.MULTILINE)
+    found = re.search(r"^(?:\d+ to \d+ of (?:about |at least )?)?(\d+)(?: results.*)?$", out, re.MULTILINE)
     return int(found[1]) if found else 0
 
 
