@@ -47,18 +47,22 @@ def record(command, typed):
 
 def screen(text):
     """Rows of (character, bold) as they stand in the end, with what the terminal understands of what is written here."""
-    rows, row, column, bold = [[]], 0, 0, False
+    rows, row, column, bold, wraps = [[]], 0, 0, False, True
     for numbers, order, character in re.findall(r"\x1b\[([0-9;?]*)([A-Za-z])|([^\x1b])", text):
         if order == "m":
             bold = "1" in numbers.split(";")
         elif order == "A":
             row = max(0, row - int(numbers or 1))
+        elif numbers == "?7":
+            wraps = order == "h"
         elif order in ("J", "K"):
             del rows[row][column:]
             del rows[row + 1 if order == "J" else len(rows):]
         elif character == "\r":
             column = 0
         elif character:
+            if column == COLUMNS and not wraps and character != "\n":
+                continue
             if character == "\n" or column == COLUMNS:
                 row, column = row + 1, 0
                 if row == len(rows):
