@@ -144,8 +144,7 @@ std::string RestartCommand(const std::string& daemon, pid_t pid) {
   if (is_service && (pid == 0 || cgroup.find('/' + daemon + ".service") != std::string::npos)) {
     return ShellLine({"systemctl", "restart", daemon});
   }
-  const std::string start =
-      is_service ? ShellLine({"systemctl", "restart", daemon}) : ShellLine({"setsid", "-f", daemon});
+  std::string start = is_service ? ShellLine({"systemctl", "restart", daemon}) : ShellLine({"setsid", "-f", daemon});
   if (pid == 0) return start;
   return "kill " + number + "; while kill -0 " + number + " 2>/dev/null; do sleep 0.1; done; " + start;
 }
