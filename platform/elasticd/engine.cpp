@@ -186,31 +186,26 @@ Engine::Rest Engine::Handle(const std::string& request, Answer& answer, const Ma
 }
 
 void Engine::HandleSearch(const Identity& user, const std::string& request, Answer& answer) {
-  try {
-    AsErrors([&] {
-      Json::Value parsed;
-      if (!fromString(parsed, request) || !parsed.isObject() || !parsed["data"].isObject()) {
-        throw Error(kMalformedRequest, "A request is an object with \"command\" and \"data\"");
-      }
-      if (parsed["command"] != kSearch)
-        throw Error(kUnknownCommand, std::string("Users may ask for ") + kSearch + " only");
-      const Json::Value& data = parsed["data"];
-      SearchRequest search = ParseSearch(Object(data, "query"));
-      const std::optional<Identity> named = data.isMember("as") ? FindIdentity(Text(data, "as")) : user;
-      if (!named || named->user != user.user) throw Error(kBadArgument, "Only root may search as another user");
-      if (!data["query"].isMember("size")) search.size = kMostHitsOfUsers - std::min(search.from, kMostHitsOfUsers);
-      if (search.from > kMostHitsOfUsers || search.size > kMostHitsOfUsers - search.from) {
-        throw Error(kBadQuery, "Ask for no more than the first " + std::to_string(kMostHitsOfUsers) + " hits");
-      }
-      if (user.user != 0) search.as = user;
-      answer.Append("{\"success\":true,\"data\":");
-      Get(data)->Find(search, answer);
-      answer.Append("}");
-    });
-  } catch (const Error& error) {
-    answer.Clear();
-    answer.Append(Failure(error));
-  }
+  AsErrors([&] {
+    Json::Value parsed;
+    if (!fromString(parsed, request) || !parsed.isObject() || !parsed["data"].isObject()) {
+      throw Error(kMalformedRequest, "A request is an object with \"command\" and \"data\"");
+    }
+    if (parsed["command"] != kSearch)
+      throw Error(kUnknownCommand, std::string("Users may ask for ") + kSearch + " only");
+    const Json::Value& data = parsed["data"];
+    SearchRequest search = ParseSearch(Object(data, "query"));
+    const std::optional<Identity> named = data.isMember("as") ? FindIdentity(Text(data, "as")) : user;
+    if (!named || named->user != user.user) throw Error(kBadArgument, "Only root may search as another user");
+    if (!data["query"].isMember("size")) search.size = kMostHitsOfUsers - std::min(search.from, kMostHitsOfUsers);
+    if (search.from > kMostHitsOfUsers || search.size > kMostHitsOfUsers - search.from) {
+      throw Error(kBadQuery, "Ask for no more than the first " + std::to_string(kMostHitsOfUsers) + " hits");
+    }
+    if (user.user != 0) search.as = user;
+    answer.Append("{\"success\":true,\"data\":");
+    Get(data)->Find(search, answer);
+    answer.Append("}");
+  });
 }
 
 // The one command that comes by the thousand: it is answered as soon as it cannot be refused any more, so that the

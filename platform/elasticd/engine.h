@@ -32,7 +32,8 @@ class Engine {
   using Rest = std::function<void()>;
   Rest Handle(const std::string& request, Answer& answer, const MakeWay& make_way);
 
-  // Answers a search of somebody who may do nothing else, as that user. Throws nothing.
+  // Answers a search of somebody who may do nothing else, as that user. Throws Error where it is refused; the answer is
+  // then of no use.
   void HandleSearch(const Identity& user, const std::string& request, Answer& answer);
 
   // The answer to a request that is refused.

@@ -125,10 +125,6 @@ bool ReadableOnly::IsReadable(DocumentId id) {
     throw Error(kBadQuery, "The search fits too much to look at in " + std::to_string(kLongest.count()) +
                                " seconds; more letters or words make it shorter");
   }
-  return Look(id);
-}
-
-bool ReadableOnly::Look(DocumentId id) {
   const std::string packed = reader_.Place(id);
   if (packed.empty()) return false;
   const Place place = UnpackPlace(packed);

@@ -37,7 +37,6 @@ class ReadableOnly {
   void RestrictParts(Query& query);
   void Expand(Query& beginning);
   bool WasReadable(DocumentId id);
-  bool Look(DocumentId id);
   bool MayEnter(DirectoryId directory, const std::string& path);
   bool IsKnownAs(DocumentId id, const struct stat& info) const;
 

@@ -8,10 +8,11 @@
 namespace quarrox::elasticd {
 namespace {
 
-// Searches in an index go one by one, so that more of one user at a time would only hold up the others.
-constexpr int kMostOfAll = 32;
+// Of different users, each of which costs a thread.
+constexpr size_t kMostOfAll = 32;
 
-// How long a user's search waits for another one of the same user.
+// How long a user's search waits for another one of the same user: in an index they go one by one, so that more of one
+// user at a time would only hold up the others.
 constexpr std::chrono::seconds kPatience(15);
 
 // What is not read waits on the disk: a page of hits is far less, and the longest list of them some megabytes.
